@@ -1,0 +1,152 @@
+// The SafeString class's module functions and ToString.
+#include <cstring>
+#include <string>
+
+#include "convert/scalar.h"
+#include "convert/text.h"
+#include "runtime/module.h"
+#include "runtime/wrap.h"
+
+namespace client3 {
+
+using ZarvoSDKClientCPP::SafeString;
+
+namespace {
+
+constexpr const char* kNewSafeStringOverloads =
+    "Wrong number or type of arguments for overloaded function 'new_SafeString'.\n"
+    "  Possible C/C++ prototypes are:\n"
+    "    ZarvoSDKClientCPP::SafeString::SafeString(char const *)\n"
+    "    ZarvoSDKClientCPP::SafeString::SafeString()\n"
+    "    ZarvoSDKClientCPP::SafeString::SafeString(std::string const &)\n"
+    "    ZarvoSDKClientCPP::SafeString::SafeString(ZarvoSDKClientCPP::SafeString const &)\n";
+
+// A heap copy of the UTF-8 of a str, or of the text of a character-pointer proxy (`made` tells
+// which). Returns null when the object is neither; any error it met is cleared.
+char* TextOf(PyObject* o, bool& made) {
+  made = false;
+  if (PyUnicode_Check(o)) {
+    PyObject* bytes = PyUnicode_AsUTF8String(o);
+    if (!bytes) {
+      PyErr_Clear();
+      return nullptr;
+    }
+    Py_ssize_t size = PyBytes_GET_SIZE(bytes);
+    char* copy = new char[size + 1];
+    std::memcpy(copy, PyBytes_AS_STRING(bytes), size + 1);
+    Py_DECREF(bytes);
+    made = true;
+    return copy;
+  }
+  void* pointer = nullptr;
+  if (TypeInfo* charType = TypeQuery("_p_char"); charType && ConvertPtr(o, &pointer, charType, 0) >= 0 && pointer)
+    return static_cast<char*>(pointer);
+  return nullptr;
+}
+
+// The `std::string const &` conversion: a str or a character-pointer proxy gives a new string; a
+// proxy of a registered "std::string *" type gives that very string.
+int AsStdString(PyObject* o, std::string** out) {
+  bool made;
+  if (char* text = TextOf(o, made)) {
+    if (out) *out = new std::string(text);
+    if (made) delete[] text;
+    return NewObjectMask;
+  }
+  TypeInfo* stringType = TypeQuery("std::string *");
+  if (!stringType) return ResultError;
+  void* pointer = nullptr;
+  int code = ConvertPtr(o, &pointer, stringType, 0);
+  if (code >= 0 && out) *out = static_cast<std::string*>(pointer);
+  return code;
+}
+
+PyObject* NewOwned(SafeString* text) {
+  return NewPointerObj(nullptr, text, TypeFor<SafeString>(), PointerOwn | PointerNoShadow);
+}
+
+// Makes a SafeString that views `text`. The storage is kept for the life of the process: the view
+// never owns it, and releasing it would leave the new string pointing at freed memory.
+PyObject* NewView(const char* text) {
+  std::size_t size = std::strlen(text) + 1;
+  char* kept = new char[size];
+  std::memcpy(kept, text, size);
+  return NewOwned(new SafeString(static_cast<const char*>(kept)));
+}
+
+PyObject* NewSafeString(PyObject*, PyObject* args) {
+  PyObject* argv[1];
+  Py_ssize_t argc = UnpackTuple(args, "new_SafeString", 0, 1, argv);
+  if (argc == 1) return NewOwned(new SafeString());
+  if (argc == 2) {
+    void* pointer = nullptr;
+    if (ConvertPtr(argv[0], &pointer, TypeFor<SafeString>(), PointerNoNull) >= 0 && pointer) {
+      // The copy form: its argument goes through the text conversion, which takes only str and
+      // bytes, so a SafeString proxy ends here with "Expected string type".
+      String source;
+      if (source.load(argv[0]) < 0) return nullptr;
+      return NewOwned(new SafeString(source.get()));
+    }
+    if (AsStdString(argv[0], nullptr) >= 0) {
+      std::string* text = nullptr;
+      int code = AsStdString(argv[0], &text);
+      if (code < 0) {
+        PyErr_SetString(ErrorType(ArgError(code)), "in method 'new_SafeString', argument 1 of type 'std::string const &'");
+        return nullptr;
+      }
+      if (!text) {
+        PyErr_SetString(PyExc_ValueError,
+                        "invalid null reference in method 'new_SafeString', argument 1 of type 'std::string const &'");
+        return nullptr;
+      }
+      PyObject* result = NewView(text->c_str());
+      if (code & NewObjectMask) delete text;
+      return result;
+    }
+    bool made;
+    if (char* text = TextOf(argv[0], made)) {
+      PyObject* result = NewView(text);
+      if (made) delete[] text;
+      return result;
+    }
+  }
+  RaiseOrModifyTypeError(kNewSafeStringOverloads);
+  return nullptr;
+}
+
+const char* ResultMessage(ZarvoSDKClientCPP::ResultCode::Enum code) {
+  switch (code) {
+    case 0: return "OK";
+    case 1000: return "Unable to communicate with the host application.";
+    case 1001: return "Host application failed to respond to the information request.";
+    case 1002: return "Unable to interpret information sent from the host application.";
+    case 1003: return "Host application encountered an error processing the request.";
+    case 1004: return "Frame number specified is invalid.";
+    case 1005: return "Unable to convert output parameter to a numeric value.";
+    case 1006: return "Invalid number of frames returned, expected one frame.";
+    default: return "Unknown Error";
+  }
+}
+
+constexpr auto IsEmpty = [](const SafeString* s) { return !s->Text() || !*s->Text(); };
+constexpr auto Value = [](const SafeString* s) { return SafeStringText(*s); };
+constexpr auto Message = [](ZarvoSDKClientCPP::ResultCode::Enum code) { return ToPython(std::string(ResultMessage(code))); };
+
+using ResultCodeArg = EnumKind<ZarvoSDKClientCPP::ResultCode::Enum, "ZarvoSDKClientCPP::ResultCode::Enum">;
+
+using Functions = Table<
+    Raw<"new_SafeString", Tuple, NewSafeString>,
+    Fn<"delete_SafeString", Object, Delete<SafeString>, Disowned<SafeString>>,
+    Fn<"SafeString_IsEmpty", Object, IsEmpty, ConstSelf<SafeString>>,
+    Fn<"SafeString_Value", Object, Value, ConstSelf<SafeString>>,
+    Fn<"SafeString___str__", Object, Value, ConstSelf<SafeString>>,
+    Fn<"SafeString___repr__", Object, Value, ConstSelf<SafeString>>,
+    Register<"SafeString", p_SafeString>,
+    Init<"SafeString">,
+    Fn<"ToString", Object, Message, ResultCodeArg>>;
+
+}  // namespace
+
+std::span<const PyMethodDef> SafeStringFunctions() { return Functions::defs; }
+
+}  // namespace client3

@@ -1,0 +1,142 @@
+// The module entry: runtime singletons, the function table, the shared type ring and the result-code
+// constants.
+#include <cstdlib>
+#include <cstring>
+
+#include "runtime/module.h"
+#include "runtime/types.h"
+
+namespace client3 {
+
+namespace {
+
+// The module's constants besides the result codes: none, only the terminator.
+struct Constant {
+  int kind;
+  const char* name;
+  long integer;
+  double real;
+  void* pointer;
+  TypeInfo** type;
+};
+enum { ConstantPointer = 4, ConstantPacked = 5 };
+Constant constantTable[] = {{0, nullptr, 0, 0.0, nullptr, nullptr}};
+
+constexpr std::size_t kFunctionCount = 705;
+PyMethodDef functionTable[kFunctionCount + 1];
+
+std::size_t BuildFunctionTable() {
+  std::size_t count = 0;
+  for (auto family : {IteratorFunctions(), VectorFunctions(), SafeStringFunctions(), RecordFunctions(),
+                      ClientFunctions()}) {
+    for (const PyMethodDef& def : family)
+      if (count < kFunctionCount) functionTable[count++] = def;
+  }
+  functionTable[count] = {nullptr, nullptr, 0, nullptr};
+  return count;
+}
+
+// Hexadecimal of a pointer value, byte by byte from its lowest address.
+char* PackHex(char* out, const void* data, std::size_t size) {
+  static const char hex[] = "0123456789abcdef";
+  const unsigned char* bytes = static_cast<const unsigned char*>(data);
+  for (std::size_t i = 0; i < size; ++i) {
+    *out++ = hex[bytes[i] >> 4];
+    *out++ = hex[bytes[i] & 0xf];
+  }
+  *out = 0;
+  return out;
+}
+
+// Points the docs that name a pointer constant ("swig_ptr: NAME") at the constant's value.
+void FixMethodDocs(PyMethodDef* methods) {
+  static const char marker[] = "swig_ptr: ";
+  for (PyMethodDef* def = methods; def->ml_name; ++def) {
+    const char* found = def->ml_doc ? std::strstr(def->ml_doc, marker) : nullptr;
+    if (!found) continue;
+    const char* name = found + sizeof marker - 1;
+    for (Constant* constant = constantTable; constant->kind; ++constant) {
+      if (std::strncmp(constant->name, name, std::strlen(constant->name)) != 0) continue;
+      if (constant->kind != ConstantPointer || !constant->pointer) break;
+      const char* mangled = (*constant->type)->mangledName;
+      std::size_t head = found - def->ml_doc;
+      std::size_t size = head + 10 + std::strlen(mangled) + 10;
+      char* doc = static_cast<char*>(std::malloc(size));
+      if (!doc) break;
+      std::memcpy(doc, def->ml_doc, head);
+      char* out = doc + head;
+      std::memcpy(out, marker, sizeof marker - 1);
+      out += sizeof marker - 1;
+      *out++ = '_';
+      out = PackHex(out, &constant->pointer, sizeof constant->pointer);
+      if (std::strlen(mangled) + 1 <= size - (out - doc)) std::strcpy(out, mangled);
+      def->ml_doc = doc;  // kept for the life of the process
+      break;
+    }
+  }
+}
+
+void InstallConstants(PyObject* dict) {
+  for (Constant* constant = constantTable; constant->kind; ++constant) {
+    PyObject* value = nullptr;
+    if (constant->kind == ConstantPointer) {
+      value = NewPointerObj(nullptr, constant->pointer, *constant->type, 0);
+    } else if (constant->kind == ConstantPacked) {
+      if (constant->pointer)
+        value = SwigPyPacked_New(constant->pointer, static_cast<std::size_t>(constant->integer), *constant->type);
+      else
+        value = (Py_INCREF(Py_None), Py_None);
+    }
+    if (value) {
+      PyDict_SetItemString(dict, constant->name, value);
+      Py_DECREF(value);
+    }
+  }
+}
+
+PyModuleDef moduleDef = {PyModuleDef_HEAD_INIT, "_Client3", nullptr, -1, functionTable,
+                         nullptr,               nullptr,    nullptr, nullptr};
+
+const struct {
+  const char* name;
+  long value;
+} resultCodes[] = {
+    {"Success", 0},
+    {"UnknownStatus", 1},
+    {"NotConnected", 1000},
+    {"RequestTimedOut", 1001},
+    {"ReplyParsingError", 1002},
+    {"ApplicationError", 1003},
+    {"InvalidFrameNumber", 1004},
+    {"ConversionError", 1005},
+    {"ExpectedOneFrame", 1006},
+};
+
+}  // namespace
+
+}  // namespace client3
+
+PyMODINIT_FUNC PyInit__Client3() {
+  using namespace client3;
+  ThisName();
+  TypeCache();
+  SwigPyPacked_type();
+  SwigPyObject_type();
+  static std::size_t built = BuildFunctionTable();
+  (void)built;
+  FixMethodDocs(functionTable);
+  PyObject* module = PyModule_Create2(&moduleDef, 1013);
+  if (!module) return nullptr;
+  PyObject* dict = PyModule_GetDict(module);
+  InitializeModule(nullptr);
+  InstallConstants(dict);
+  ContainerOwnerAttribute();
+  for (const auto& code : resultCodes) {
+    PyObject* value = PyLong_FromLong(code.value);
+    if (value) {
+      PyDict_SetItemString(dict, code.name, value);
+      Py_DECREF(value);
+    }
+  }
+  return module;
+}

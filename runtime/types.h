@@ -1,0 +1,171 @@
+// The native types that cross into scripts: one descriptor each, sorted by mangled name (the lookup
+// by mangled name is a binary search), with the readable spellings whose last one is shown.
+#pragma once
+
+#include <memory>
+#include <stdexcept>
+#include <vector>
+
+#include "runtime/runtime.h"
+#include "ZarvoSDKClientCPP/Outputs.h"
+#include "ZarvoSDKClientCPP/ZarvoPelluxPostClient.h"
+
+namespace swig {
+class SwigPyIterator;
+}
+
+namespace client3 {
+
+// X(identifier, mangled name, readable names)
+#define CLIENT3_TYPES(X) \
+  X(p_IStringFactory, "_p_ZarvoSDKClientCPP__IStringFactory", "ZarvoSDKClientCPP::IStringFactory *") \
+  X(p_Output_CircleFitSettings, "_p_ZarvoSDKClientCPP__Output_CircleFitSettings", "ZarvoSDKClientCPP::Output_CircleFitSettings *") \
+  X(p_Output_GetAttribute, "_p_ZarvoSDKClientCPP__Output_GetAttribute", "ZarvoSDKClientCPP::Output_GetAttribute *") \
+  X(p_Output_GetBoneDetails, "_p_ZarvoSDKClientCPP__Output_GetBoneDetails", "ZarvoSDKClientCPP::Output_GetBoneDetails *") \
+  X(p_Output_GetBoneNames, "_p_ZarvoSDKClientCPP__Output_GetBoneNames", "ZarvoSDKClientCPP::Output_GetBoneNames *") \
+  X(p_Output_GetCommandInfo, "_p_ZarvoSDKClientCPP__Output_GetCommandInfo", "ZarvoSDKClientCPP::Output_GetCommandInfo *") \
+  X(p_Output_GetCommandList, "_p_ZarvoSDKClientCPP__Output_GetCommandList", "ZarvoSDKClientCPP::Output_GetCommandList *") \
+  X(p_Output_GetConstraintDetails, "_p_ZarvoSDKClientCPP__Output_GetConstraintDetails", "ZarvoSDKClientCPP::Output_GetConstraintDetails *") \
+  X(p_Output_GetConstraintNames, "_p_ZarvoSDKClientCPP__Output_GetConstraintNames", "ZarvoSDKClientCPP::Output_GetConstraintNames *") \
+  X(p_Output_GetFloat, "_p_ZarvoSDKClientCPP__Output_GetFloat", "ZarvoSDKClientCPP::Output_GetFloat *") \
+  X(p_Output_GetInteger, "_p_ZarvoSDKClientCPP__Output_GetInteger", "ZarvoSDKClientCPP::Output_GetInteger *") \
+  X(p_Output_GetIntegerList, "_p_ZarvoSDKClientCPP__Output_GetIntegerList", "ZarvoSDKClientCPP::Output_GetIntegerList *") \
+  X(p_Output_GetJointDetails, "_p_ZarvoSDKClientCPP__Output_GetJointDetails", nullptr) \
+  X(p_Output_GetJointNames, "_p_ZarvoSDKClientCPP__Output_GetJointNames", nullptr) \
+  X(p_Output_GetMarkerNames, "_p_ZarvoSDKClientCPP__Output_GetMarkerNames", "ZarvoSDKClientCPP::Output_GetMarkerNames *") \
+  X(p_Output_GetObject, "_p_ZarvoSDKClientCPP__Output_GetObject", "ZarvoSDKClientCPP::Output_GetObject *") \
+  X(p_Output_GetObjectList, "_p_ZarvoSDKClientCPP__Output_GetObjectList", "ZarvoSDKClientCPP::Output_GetObjectList *") \
+  X(p_Output_GetRootBone, "_p_ZarvoSDKClientCPP__Output_GetRootBone", "ZarvoSDKClientCPP::Output_GetRootBone *") \
+  X(p_Output_GetRootSegment, "_p_ZarvoSDKClientCPP__Output_GetRootSegment", nullptr) \
+  X(p_Output_GetSceneName, "_p_ZarvoSDKClientCPP__Output_GetSceneName", "ZarvoSDKClientCPP::Output_GetSceneName *") \
+  X(p_Output_GetSegmentDetails, "_p_ZarvoSDKClientCPP__Output_GetSegmentDetails", nullptr) \
+  X(p_Output_GetSegmentNames, "_p_ZarvoSDKClientCPP__Output_GetSegmentNames", nullptr) \
+  X(p_Output_GetServerInfo, "_p_ZarvoSDKClientCPP__Output_GetServerInfo", "ZarvoSDKClientCPP::Output_GetServerInfo *") \
+  X(p_Output_GetString, "_p_ZarvoSDKClientCPP__Output_GetString", "ZarvoSDKClientCPP::Output_GetString *") \
+  X(p_Output_GetStringList, "_p_ZarvoSDKClientCPP__Output_GetStringList", "ZarvoSDKClientCPP::Output_GetStringList *") \
+  X(p_Output_GetSubjectNames, "_p_ZarvoSDKClientCPP__Output_GetSubjectNames", "ZarvoSDKClientCPP::Output_GetSubjectNames *") \
+  X(p_Output_GetSubjectParamDetails, "_p_ZarvoSDKClientCPP__Output_GetSubjectParamDetails", "ZarvoSDKClientCPP::Output_GetSubjectParamDetails *") \
+  X(p_Output_GetSubjectParamNames, "_p_ZarvoSDKClientCPP__Output_GetSubjectParamNames", "ZarvoSDKClientCPP::Output_GetSubjectParamNames *") \
+  X(p_Output_GetTakeInfo, "_p_ZarvoSDKClientCPP__Output_GetTakeInfo", "ZarvoSDKClientCPP::Output_GetTakeInfo *") \
+  X(p_Output_GetTrajectory, "_p_ZarvoSDKClientCPP__Output_GetTrajectory", "ZarvoSDKClientCPP::Output_GetTrajectory *") \
+  X(p_Output_GetTrajectoryAtFrame, "_p_ZarvoSDKClientCPP__Output_GetTrajectoryAtFrame", "ZarvoSDKClientCPP::Output_GetTrajectoryAtFrame *") \
+  X(p_Output_GetTrialName, "_p_ZarvoSDKClientCPP__Output_GetTrialName", nullptr) \
+  X(p_Output_GetUnsignedLong, "_p_ZarvoSDKClientCPP__Output_GetUnsignedLong", "ZarvoSDKClientCPP::Output_GetUnsignedLong *") \
+  X(p_Output_GetUnsignedLongList, "_p_ZarvoSDKClientCPP__Output_GetUnsignedLongList", "ZarvoSDKClientCPP::Output_GetUnsignedLongList *") \
+  X(p_Output_HasTrajectory, "_p_ZarvoSDKClientCPP__Output_HasTrajectory", "ZarvoSDKClientCPP::Output_HasTrajectory *") \
+  X(p_Output_LabelROMSettings, "_p_ZarvoSDKClientCPP__Output_LabelROMSettings", "ZarvoSDKClientCPP::Output_LabelROMSettings *") \
+  X(p_Output_LabelingSettings, "_p_ZarvoSDKClientCPP__Output_LabelingSettings", "ZarvoSDKClientCPP::Output_LabelingSettings *") \
+  X(p_Output_LabelingSubjectCalibrationSettings, "_p_ZarvoSDKClientCPP__Output_LabelingSubjectCalibrationSettings", "ZarvoSDKClientCPP::Output_LabelingSubjectCalibrationSettings *") \
+  X(p_Output_OcclusionFixingSettings, "_p_ZarvoSDKClientCPP__Output_OcclusionFixingSettings", "ZarvoSDKClientCPP::Output_OcclusionFixingSettings *") \
+  X(p_Output_ProcessRequest, "_p_ZarvoSDKClientCPP__Output_ProcessRequest", "ZarvoSDKClientCPP::Output_ProcessRequest *") \
+  X(p_Output_ReconstructSettings, "_p_ZarvoSDKClientCPP__Output_ReconstructSettings", "ZarvoSDKClientCPP::Output_ReconstructSettings *") \
+  X(p_Output_Result, "_p_ZarvoSDKClientCPP__Output_Result", "ZarvoSDKClientCPP::Output_Result *") \
+  X(p_Output_SolvingSettings, "_p_ZarvoSDKClientCPP__Output_SolvingSettings", "ZarvoSDKClientCPP::Output_SolvingSettings *") \
+  X(p_SafeString, "_p_ZarvoSDKClientCPP__SafeString", "ZarvoSDKClientCPP::SafeString *|std::vector< ZarvoSDKClientCPP::SafeString >::value_type *") \
+  X(p_Type_Parameter, "_p_ZarvoSDKClientCPP__Type_Parameter", "ZarvoSDKClientCPP::Type_Parameter *") \
+  X(p_VStringFactory, "_p_ZarvoSDKClientCPP__VStringFactory", nullptr) \
+  X(p_ZarvoClient, "_p_ZarvoSDKClientCPP__ZarvoClient", "ZarvoSDKClientCPP::ZarvoClient *") \
+  X(p_ZarvoPelluxPostClient, "_p_ZarvoSDKClientCPP__ZarvoPelluxPostClient", "ZarvoSDKClientCPP::ZarvoPelluxPostClient *") \
+  X(p_int64, "_p___int64", "LONGLONG *|LONG64 *|INT64 *|__int64 *") \
+  X(p_allocator_type, "_p_allocator_type", "allocator_type *") \
+  X(p_char, "_p_char", "char *") \
+  X(p_const_reference, "_p_const_reference", "const_reference *") \
+  X(p_difference_type, "_p_difference_type", "difference_type *") \
+  X(p_float, "_p_float", "FLOAT *|float *") \
+  X(p_int, "_p_int", "BOOL *|INT32 *|int *|INT *|INT_PTR *|LONG32 *") \
+  X(p_long, "_p_long", "LONG *|long *") \
+  X(p_p_PyObject, "_p_p_PyObject", "PyObject **") \
+  X(p_p_char, "_p_p_char", "char **") \
+  X(p_p_unsigned_long, "_p_p_unsigned_long", "unsigned long **|DWORD **|ULONG **") \
+  X(p_short, "_p_short", "INT16 *|SHORT *|short *") \
+  X(p_signed___int64, "_p_signed___int64", "signed __int64 *") \
+  X(p_signed_char, "_p_signed_char", "INT8 *|signed char *") \
+  X(p_size_type, "_p_size_type", "size_type *") \
+  X(p_Allocator_SafeString, "_p_std__allocatorT_ZarvoSDKClientCPP__SafeString_t", "std::vector< ZarvoSDKClientCPP::SafeString >::allocator_type *|std::allocator< ZarvoSDKClientCPP::SafeString > *") \
+  X(p_Allocator_bool, "_p_std__allocatorT_bool_t", "std::vector< bool >::allocator_type *|std::allocator< bool > *") \
+  X(p_Allocator_double, "_p_std__allocatorT_double_t", "std::vector< double >::allocator_type *|std::allocator< double > *") \
+  X(p_Allocator_float, "_p_std__allocatorT_float_t", "std::vector< float >::allocator_type *|std::allocator< float > *") \
+  X(p_Allocator_int, "_p_std__allocatorT_int_t", "std::vector< int >::allocator_type *|std::allocator< int > *") \
+  X(p_Allocator_unsigned_long_long, "_p_std__allocatorT_unsigned_long_long_t", "std::vector< unsigned long long >::allocator_type *|std::allocator< unsigned long long > *") \
+  X(p_std_invalid_argument, "_p_std__invalid_argument", "std::invalid_argument *") \
+  X(p_Vector_SafeString, "_p_std__vectorT_ZarvoSDKClientCPP__SafeString_std__allocatorT_ZarvoSDKClientCPP__SafeString_t_t", "std::vector< ZarvoSDKClientCPP::SafeString > *|std::vector< ZarvoSDKClientCPP::SafeString,std::allocator< ZarvoSDKClientCPP::SafeString > > *") \
+  X(p_Vector_Type_Parameter, "_p_std__vectorT_ZarvoSDKClientCPP__Type_Parameter_std__allocatorT_ZarvoSDKClientCPP__Type_Parameter_t_t", "std::vector< ZarvoSDKClientCPP::Type_Parameter,std::allocator< ZarvoSDKClientCPP::Type_Parameter > > *") \
+  X(p_Vector_bool, "_p_std__vectorT_bool_std__allocatorT_bool_t_t", "std::vector< bool,std::allocator< bool > > *|std::vector< bool > *") \
+  X(p_Vector_double, "_p_std__vectorT_double_std__allocatorT_double_t_t", "std::vector< double,std::allocator< double > > *|std::vector< double > *") \
+  X(p_Vector_float, "_p_std__vectorT_float_std__allocatorT_float_t_t", "std::vector< float > *|std::vector< float,std::allocator< float > > *") \
+  X(p_Vector_int, "_p_std__vectorT_int_std__allocatorT_int_t_t", "std::vector< int,std::allocator< int > > *|std::vector< int > *") \
+  X(p_Vector_unsigned_long_long, "_p_std__vectorT_unsigned_long_long_std__allocatorT_unsigned_long_long_t_t", "std::vector< unsigned long long > *|std::vector< unsigned long long,std::allocator< unsigned long long > > *") \
+  X(p_SwigPyIterator, "_p_swig__SwigPyIterator", "swig::SwigPyIterator *") \
+  X(p_unsigned___int64, "_p_unsigned___int64", "ULONGLONG *|DWORD64 *|UINT64 *|unsigned __int64 *") \
+  X(p_unsigned_char, "_p_unsigned_char", "UCHAR *|BYTE *|UINT8 *|unsigned char *") \
+  X(p_unsigned_int, "_p_unsigned_int", "DWORD32 *|UINT *|UINT32 *|unsigned int *") \
+  X(p_unsigned_long, "_p_unsigned_long", "DWORD *|ULONG *|unsigned long *") \
+  X(p_unsigned_short, "_p_unsigned_short", "WORD *|USHORT *|UINT16 *|unsigned short *") \
+  X(p_value_type, "_p_value_type", "value_type *")
+
+enum TypeId : int {
+#define CLIENT3_TYPE_ID(id, mangled, pretty) id,
+  CLIENT3_TYPES(CLIENT3_TYPE_ID)
+#undef CLIENT3_TYPE_ID
+  TypeCount
+};
+
+// The descriptor in use for a type: this module's own, or the one another module of the family
+// registered first.
+inline TypeInfo* Type(TypeId id) { return thisModule.types[id]; }
+
+// The descriptor of each native C++ type that wrappers convert.
+template <class T>
+inline constexpr TypeId TypeOf = TypeCount;
+
+#define CLIENT3_TYPE_OF(cxx, id) \
+  template <>                    \
+  inline constexpr TypeId TypeOf<cxx> = id;
+#define CLIENT3_RECORD_TYPE(name) CLIENT3_TYPE_OF(ZarvoSDKClientCPP::name, p_##name)
+// Every record derived from Output_Result.
+#define CLIENT3_DERIVED_RECORDS(X)                                                                            \
+  X(Output_ProcessRequest) X(Output_GetServerInfo) X(Output_GetCommandList)                   \
+  X(Output_GetCommandInfo) X(Output_GetSceneName) X(Output_GetSubjectNames) X(Output_GetMarkerNames)           \
+  X(Output_HasTrajectory) X(Output_GetTrajectory) X(Output_GetTrajectoryAtFrame) X(Output_GetBoneNames)        \
+  X(Output_GetRootBone) X(Output_GetBoneDetails) X(Output_GetConstraintNames) X(Output_GetConstraintDetails)   \
+  X(Output_GetSubjectParamNames) X(Output_GetSubjectParamDetails) X(Output_GetObject) X(Output_GetObjectList)  \
+  X(Output_GetIntegerList) X(Output_GetString) X(Output_GetAttribute) X(Output_GetStringList)                  \
+  X(Output_GetInteger) X(Output_GetUnsignedLong) X(Output_GetUnsignedLongList) X(Output_GetFloat)              \
+  X(Output_GetTakeInfo) X(Output_GetJointDetails) X(Output_GetJointNames) X(Output_GetRootSegment)             \
+  X(Output_GetSegmentDetails) X(Output_GetSegmentNames) X(Output_GetTrialName) X(Output_CircleFitSettings)     \
+  X(Output_ReconstructSettings) X(Output_LabelingSettings) X(Output_OcclusionFixingSettings)                    \
+  X(Output_SolvingSettings) X(Output_LabelingSubjectCalibrationSettings) X(Output_LabelROMSettings)
+CLIENT3_DERIVED_RECORDS(CLIENT3_RECORD_TYPE)
+CLIENT3_RECORD_TYPE(Output_Result)
+CLIENT3_RECORD_TYPE(SafeString)
+CLIENT3_RECORD_TYPE(Type_Parameter)
+CLIENT3_RECORD_TYPE(IStringFactory)
+CLIENT3_RECORD_TYPE(VStringFactory)
+CLIENT3_RECORD_TYPE(ZarvoClient)
+CLIENT3_RECORD_TYPE(ZarvoPelluxPostClient)
+CLIENT3_TYPE_OF(swig::SwigPyIterator, p_SwigPyIterator)
+CLIENT3_TYPE_OF(std::vector<bool>, p_Vector_bool)
+CLIENT3_TYPE_OF(std::vector<double>, p_Vector_double)
+CLIENT3_TYPE_OF(std::vector<float>, p_Vector_float)
+CLIENT3_TYPE_OF(std::vector<int>, p_Vector_int)
+CLIENT3_TYPE_OF(std::vector<unsigned long long>, p_Vector_unsigned_long_long)
+CLIENT3_TYPE_OF(std::vector<ZarvoSDKClientCPP::SafeString>, p_Vector_SafeString)
+CLIENT3_TYPE_OF(std::vector<ZarvoSDKClientCPP::Type_Parameter>, p_Vector_Type_Parameter)
+CLIENT3_TYPE_OF(std::allocator<bool>, p_Allocator_bool)
+CLIENT3_TYPE_OF(std::allocator<double>, p_Allocator_double)
+CLIENT3_TYPE_OF(std::allocator<float>, p_Allocator_float)
+CLIENT3_TYPE_OF(std::allocator<int>, p_Allocator_int)
+CLIENT3_TYPE_OF(std::allocator<unsigned long long>, p_Allocator_unsigned_long_long)
+CLIENT3_TYPE_OF(std::allocator<ZarvoSDKClientCPP::SafeString>, p_Allocator_SafeString)
+CLIENT3_TYPE_OF(std::invalid_argument, p_std_invalid_argument)
+CLIENT3_TYPE_OF(char, p_char)
+#undef CLIENT3_RECORD_TYPE
+#undef CLIENT3_TYPE_OF
+
+template <class T>
+inline TypeInfo* TypeFor() {
+  static_assert(TypeOf<T> != TypeCount, "no descriptor for this type");
+  return Type(TypeOf<T>);
+}
+
+}  // namespace client3
