@@ -1,0 +1,21 @@
+import os
+import subprocess
+import sys
+
+import pytest
+
+sys.path.insert(0, os.path.dirname(__file__))
+
+import companion  # noqa: E402
+
+
+@pytest.fixture(scope="session", autouse=True)
+def registered_classes():
+    """Every wrapped class registered, as a script that uses the module would have it."""
+    return companion.register()
+
+
+def run_python(code):
+    """Runs `code` in a fresh interpreter; returns (exit code, stdout, stderr)."""
+    done = subprocess.run([sys.executable, "-c", code], capture_output=True, text=True, timeout=120)
+    return done.returncode, done.stdout, done.stderr
