@@ -4,6 +4,14 @@
 
 namespace client3 {
 
-std::span<const PyMethodDef> ClientFunctions() { return {}; }
+namespace {
+
+using Functions = Table<
+    Register<"ZarvoPelluxPostClient", p_ZarvoPelluxPostClient>,
+    Init<"ZarvoPelluxPostClient">>;
+
+}  // namespace
+
+std::span<const PyMethodDef> ClientFunctions() { return Functions::defs; }
 
 }  // namespace client3
