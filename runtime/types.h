@@ -16,56 +16,59 @@ class SwigPyIterator;
 
 namespace client3 {
 
-// X(identifier, mangled name, readable names)
+// X(identifier, mangled name, readable names). Most classes of the library are named alike; the ones
+// only known as sources of a cast have no readable name.
+#define CLIENT3_CLASS(X, name) X(p_##name, "_p_ZarvoSDKClientCPP__" #name, "ZarvoSDKClientCPP::" #name " *")
+#define CLIENT3_UNNAMED_CLASS(X, name) X(p_##name, "_p_ZarvoSDKClientCPP__" #name, nullptr)
 #define CLIENT3_TYPES(X) \
-  X(p_IStringFactory, "_p_ZarvoSDKClientCPP__IStringFactory", "ZarvoSDKClientCPP::IStringFactory *") \
-  X(p_Output_CircleFitSettings, "_p_ZarvoSDKClientCPP__Output_CircleFitSettings", "ZarvoSDKClientCPP::Output_CircleFitSettings *") \
-  X(p_Output_GetAttribute, "_p_ZarvoSDKClientCPP__Output_GetAttribute", "ZarvoSDKClientCPP::Output_GetAttribute *") \
-  X(p_Output_GetBoneDetails, "_p_ZarvoSDKClientCPP__Output_GetBoneDetails", "ZarvoSDKClientCPP::Output_GetBoneDetails *") \
-  X(p_Output_GetBoneNames, "_p_ZarvoSDKClientCPP__Output_GetBoneNames", "ZarvoSDKClientCPP::Output_GetBoneNames *") \
-  X(p_Output_GetCommandInfo, "_p_ZarvoSDKClientCPP__Output_GetCommandInfo", "ZarvoSDKClientCPP::Output_GetCommandInfo *") \
-  X(p_Output_GetCommandList, "_p_ZarvoSDKClientCPP__Output_GetCommandList", "ZarvoSDKClientCPP::Output_GetCommandList *") \
-  X(p_Output_GetConstraintDetails, "_p_ZarvoSDKClientCPP__Output_GetConstraintDetails", "ZarvoSDKClientCPP::Output_GetConstraintDetails *") \
-  X(p_Output_GetConstraintNames, "_p_ZarvoSDKClientCPP__Output_GetConstraintNames", "ZarvoSDKClientCPP::Output_GetConstraintNames *") \
-  X(p_Output_GetFloat, "_p_ZarvoSDKClientCPP__Output_GetFloat", "ZarvoSDKClientCPP::Output_GetFloat *") \
-  X(p_Output_GetInteger, "_p_ZarvoSDKClientCPP__Output_GetInteger", "ZarvoSDKClientCPP::Output_GetInteger *") \
-  X(p_Output_GetIntegerList, "_p_ZarvoSDKClientCPP__Output_GetIntegerList", "ZarvoSDKClientCPP::Output_GetIntegerList *") \
-  X(p_Output_GetJointDetails, "_p_ZarvoSDKClientCPP__Output_GetJointDetails", nullptr) \
-  X(p_Output_GetJointNames, "_p_ZarvoSDKClientCPP__Output_GetJointNames", nullptr) \
-  X(p_Output_GetMarkerNames, "_p_ZarvoSDKClientCPP__Output_GetMarkerNames", "ZarvoSDKClientCPP::Output_GetMarkerNames *") \
-  X(p_Output_GetObject, "_p_ZarvoSDKClientCPP__Output_GetObject", "ZarvoSDKClientCPP::Output_GetObject *") \
-  X(p_Output_GetObjectList, "_p_ZarvoSDKClientCPP__Output_GetObjectList", "ZarvoSDKClientCPP::Output_GetObjectList *") \
-  X(p_Output_GetRootBone, "_p_ZarvoSDKClientCPP__Output_GetRootBone", "ZarvoSDKClientCPP::Output_GetRootBone *") \
-  X(p_Output_GetRootSegment, "_p_ZarvoSDKClientCPP__Output_GetRootSegment", nullptr) \
-  X(p_Output_GetSceneName, "_p_ZarvoSDKClientCPP__Output_GetSceneName", "ZarvoSDKClientCPP::Output_GetSceneName *") \
-  X(p_Output_GetSegmentDetails, "_p_ZarvoSDKClientCPP__Output_GetSegmentDetails", nullptr) \
-  X(p_Output_GetSegmentNames, "_p_ZarvoSDKClientCPP__Output_GetSegmentNames", nullptr) \
-  X(p_Output_GetServerInfo, "_p_ZarvoSDKClientCPP__Output_GetServerInfo", "ZarvoSDKClientCPP::Output_GetServerInfo *") \
-  X(p_Output_GetString, "_p_ZarvoSDKClientCPP__Output_GetString", "ZarvoSDKClientCPP::Output_GetString *") \
-  X(p_Output_GetStringList, "_p_ZarvoSDKClientCPP__Output_GetStringList", "ZarvoSDKClientCPP::Output_GetStringList *") \
-  X(p_Output_GetSubjectNames, "_p_ZarvoSDKClientCPP__Output_GetSubjectNames", "ZarvoSDKClientCPP::Output_GetSubjectNames *") \
-  X(p_Output_GetSubjectParamDetails, "_p_ZarvoSDKClientCPP__Output_GetSubjectParamDetails", "ZarvoSDKClientCPP::Output_GetSubjectParamDetails *") \
-  X(p_Output_GetSubjectParamNames, "_p_ZarvoSDKClientCPP__Output_GetSubjectParamNames", "ZarvoSDKClientCPP::Output_GetSubjectParamNames *") \
-  X(p_Output_GetTakeInfo, "_p_ZarvoSDKClientCPP__Output_GetTakeInfo", "ZarvoSDKClientCPP::Output_GetTakeInfo *") \
-  X(p_Output_GetTrajectory, "_p_ZarvoSDKClientCPP__Output_GetTrajectory", "ZarvoSDKClientCPP::Output_GetTrajectory *") \
-  X(p_Output_GetTrajectoryAtFrame, "_p_ZarvoSDKClientCPP__Output_GetTrajectoryAtFrame", "ZarvoSDKClientCPP::Output_GetTrajectoryAtFrame *") \
-  X(p_Output_GetTrialName, "_p_ZarvoSDKClientCPP__Output_GetTrialName", nullptr) \
-  X(p_Output_GetUnsignedLong, "_p_ZarvoSDKClientCPP__Output_GetUnsignedLong", "ZarvoSDKClientCPP::Output_GetUnsignedLong *") \
-  X(p_Output_GetUnsignedLongList, "_p_ZarvoSDKClientCPP__Output_GetUnsignedLongList", "ZarvoSDKClientCPP::Output_GetUnsignedLongList *") \
-  X(p_Output_HasTrajectory, "_p_ZarvoSDKClientCPP__Output_HasTrajectory", "ZarvoSDKClientCPP::Output_HasTrajectory *") \
-  X(p_Output_LabelROMSettings, "_p_ZarvoSDKClientCPP__Output_LabelROMSettings", "ZarvoSDKClientCPP::Output_LabelROMSettings *") \
-  X(p_Output_LabelingSettings, "_p_ZarvoSDKClientCPP__Output_LabelingSettings", "ZarvoSDKClientCPP::Output_LabelingSettings *") \
-  X(p_Output_LabelingSubjectCalibrationSettings, "_p_ZarvoSDKClientCPP__Output_LabelingSubjectCalibrationSettings", "ZarvoSDKClientCPP::Output_LabelingSubjectCalibrationSettings *") \
-  X(p_Output_OcclusionFixingSettings, "_p_ZarvoSDKClientCPP__Output_OcclusionFixingSettings", "ZarvoSDKClientCPP::Output_OcclusionFixingSettings *") \
-  X(p_Output_ProcessRequest, "_p_ZarvoSDKClientCPP__Output_ProcessRequest", "ZarvoSDKClientCPP::Output_ProcessRequest *") \
-  X(p_Output_ReconstructSettings, "_p_ZarvoSDKClientCPP__Output_ReconstructSettings", "ZarvoSDKClientCPP::Output_ReconstructSettings *") \
-  X(p_Output_Result, "_p_ZarvoSDKClientCPP__Output_Result", "ZarvoSDKClientCPP::Output_Result *") \
-  X(p_Output_SolvingSettings, "_p_ZarvoSDKClientCPP__Output_SolvingSettings", "ZarvoSDKClientCPP::Output_SolvingSettings *") \
+  CLIENT3_CLASS(X, IStringFactory) \
+  CLIENT3_CLASS(X, Output_CircleFitSettings) \
+  CLIENT3_CLASS(X, Output_GetAttribute) \
+  CLIENT3_CLASS(X, Output_GetBoneDetails) \
+  CLIENT3_CLASS(X, Output_GetBoneNames) \
+  CLIENT3_CLASS(X, Output_GetCommandInfo) \
+  CLIENT3_CLASS(X, Output_GetCommandList) \
+  CLIENT3_CLASS(X, Output_GetConstraintDetails) \
+  CLIENT3_CLASS(X, Output_GetConstraintNames) \
+  CLIENT3_CLASS(X, Output_GetFloat) \
+  CLIENT3_CLASS(X, Output_GetInteger) \
+  CLIENT3_CLASS(X, Output_GetIntegerList) \
+  CLIENT3_UNNAMED_CLASS(X, Output_GetJointDetails) \
+  CLIENT3_UNNAMED_CLASS(X, Output_GetJointNames) \
+  CLIENT3_CLASS(X, Output_GetMarkerNames) \
+  CLIENT3_CLASS(X, Output_GetObject) \
+  CLIENT3_CLASS(X, Output_GetObjectList) \
+  CLIENT3_CLASS(X, Output_GetRootBone) \
+  CLIENT3_UNNAMED_CLASS(X, Output_GetRootSegment) \
+  CLIENT3_CLASS(X, Output_GetSceneName) \
+  CLIENT3_UNNAMED_CLASS(X, Output_GetSegmentDetails) \
+  CLIENT3_UNNAMED_CLASS(X, Output_GetSegmentNames) \
+  CLIENT3_CLASS(X, Output_GetServerInfo) \
+  CLIENT3_CLASS(X, Output_GetString) \
+  CLIENT3_CLASS(X, Output_GetStringList) \
+  CLIENT3_CLASS(X, Output_GetSubjectNames) \
+  CLIENT3_CLASS(X, Output_GetSubjectParamDetails) \
+  CLIENT3_CLASS(X, Output_GetSubjectParamNames) \
+  CLIENT3_CLASS(X, Output_GetTakeInfo) \
+  CLIENT3_CLASS(X, Output_GetTrajectory) \
+  CLIENT3_CLASS(X, Output_GetTrajectoryAtFrame) \
+  CLIENT3_UNNAMED_CLASS(X, Output_GetTrialName) \
+  CLIENT3_CLASS(X, Output_GetUnsignedLong) \
+  CLIENT3_CLASS(X, Output_GetUnsignedLongList) \
+  CLIENT3_CLASS(X, Output_HasTrajectory) \
+  CLIENT3_CLASS(X, Output_LabelROMSettings) \
+  CLIENT3_CLASS(X, Output_LabelingSettings) \
+  CLIENT3_CLASS(X, Output_LabelingSubjectCalibrationSettings) \
+  CLIENT3_CLASS(X, Output_OcclusionFixingSettings) \
+  CLIENT3_CLASS(X, Output_ProcessRequest) \
+  CLIENT3_CLASS(X, Output_ReconstructSettings) \
+  CLIENT3_CLASS(X, Output_Result) \
+  CLIENT3_CLASS(X, Output_SolvingSettings) \
   X(p_SafeString, "_p_ZarvoSDKClientCPP__SafeString", "ZarvoSDKClientCPP::SafeString *|std::vector< ZarvoSDKClientCPP::SafeString >::value_type *") \
-  X(p_Type_Parameter, "_p_ZarvoSDKClientCPP__Type_Parameter", "ZarvoSDKClientCPP::Type_Parameter *") \
-  X(p_VStringFactory, "_p_ZarvoSDKClientCPP__VStringFactory", nullptr) \
-  X(p_ZarvoClient, "_p_ZarvoSDKClientCPP__ZarvoClient", "ZarvoSDKClientCPP::ZarvoClient *") \
-  X(p_ZarvoPelluxPostClient, "_p_ZarvoSDKClientCPP__ZarvoPelluxPostClient", "ZarvoSDKClientCPP::ZarvoPelluxPostClient *") \
+  CLIENT3_CLASS(X, Type_Parameter) \
+  CLIENT3_UNNAMED_CLASS(X, VStringFactory) \
+  CLIENT3_CLASS(X, ZarvoClient) \
+  CLIENT3_CLASS(X, ZarvoPelluxPostClient) \
   X(p_int64, "_p___int64", "LONGLONG *|LONG64 *|INT64 *|__int64 *") \
   X(p_allocator_type, "_p_allocator_type", "allocator_type *") \
   X(p_char, "_p_char", "char *") \
