@@ -98,7 +98,9 @@ PyObject* ProxyNext(PyObject* op, PyObject* = nullptr) {
 PyObject* ProxyLong(PyObject* op) { return PyLong_FromVoidPtr(AsProxy(op)->ptr); }
 
 PyObject* ProxyCompare(PyObject* a, PyObject* b, int op) {
-  if (op != Py_EQ && op != Py_NE) {
+  // A right operand that is no proxy has no address to compare; the interpreter then falls back
+  // to identity.
+  if ((op != Py_EQ && op != Py_NE) || !SwigPyObject_Check(b)) {
     Py_INCREF(Py_NotImplemented);
     return Py_NotImplemented;
   }
