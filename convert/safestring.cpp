@@ -130,7 +130,10 @@ const char* ResultMessage(ZarvoSDKClientCPP::ResultCode::Enum code) {
 
 constexpr auto IsEmpty = [](const SafeString* s) { return !s->Text() || !*s->Text(); };
 constexpr auto Value = [](const SafeString* s) { return SafeStringText(*s); };
-constexpr auto Message = [](ZarvoSDKClientCPP::ResultCode::Enum code) { return ToPython(std::string(ResultMessage(code))); };
+constexpr auto Message = [](ZarvoSDKClientCPP::ResultCode::Enum code) {
+  const char* message = ResultMessage(code);
+  return TextToPython(message, std::strlen(message));
+};
 
 using ResultCodeArg = EnumKind<ZarvoSDKClientCPP::ResultCode::Enum, "ZarvoSDKClientCPP::ResultCode::Enum">;
 
