@@ -9,93 +9,84 @@ import pytest
 import _Client3 as m
 
 NS = "ZarvoSDKClientCPP::"
-VECTOR = {
-    "bool": "bool", "int": "int", "ull": "unsigned long long", "float": "float", "double": "double",
-    "ss": NS + "SafeString", "param": NS + "Type_Parameter",
-}
+KINDS = {"i": "int", "u": "unsigned int", "q": "unsigned long long", "b": "bool", "f": "float", "d": "double",
+         "e": NS + "ResultCode::Enum", "s": NS + "SafeString *"}
+ELEMENTS = {"b": "bool", "i": "int", "q": "unsigned long long", "f": "float", "d": "double",
+            "s": NS + "SafeString", "p": NS + "Type_Parameter"}
 
-# Every record in table order: (name, constructible by scripts, fields in order, member functions).
-# A field kind is a scalar type text, "enum", "str" (SafeString) or "vec:<element>".
-RECORDS = [
-    ("Type_Parameter", True, [("Name", "str"), ("Value", "str")], []),
-    ("Output_Result", False, [("Result", "enum"), ("ResultString", "str")], ["Error"]),
-    ("Output_ProcessRequest", False, [("OutputParameters", "vec:param")], []),
-    ("Output_GetServerInfo", False, [("Program", "str"), ("MajorVersion", "unsigned int"),
-                                     ("MinorVersion", "unsigned int"), ("PointVersion", "unsigned int"),
-                                     ("ReleaseType", "str")], []),
-    ("Output_GetCommandList", False, [("Commands", "vec:ss")], []),
-    ("Output_GetCommandInfo", False, [("Name", "str"), ("Description", "str"), ("InputParameters", "vec:param"),
-                                      ("OutputParameters", "vec:param")], ["DefaultOutputString"]),
-    ("Output_GetSceneName", False, [("Name", "str"), ("Path", "str")], []),
-    ("Output_GetSubjectNames", False, [("Names", "vec:ss"), ("Models", "vec:ss"), ("Active", "vec:bool")], []),
-    ("Output_GetMarkerNames", False, [("Names", "vec:ss")], []),
-    ("Output_HasTrajectory", False, [("Exists", "bool")], []),
-    ("Output_GetTrajectory", False, [("X", "vec:double"), ("Y", "vec:double"), ("Z", "vec:double"),
-                                     ("E", "vec:bool")], []),
-    ("Output_GetTrajectoryAtFrame", False, [("X", "double"), ("Y", "double"), ("Z", "double"), ("E", "bool")], []),
-    ("Output_GetBoneNames", False, [("Names", "vec:ss")], []),
-    ("Output_GetRootBone", False, [("Name", "str")], []),
-    ("Output_GetBoneDetails", False, [("Parent", "str"), ("Children", "vec:ss")], []),
-    ("Output_GetConstraintNames", False, [("Names", "vec:ss")], []),
-    ("Output_GetConstraintDetails", False, [("Active", "bool"), ("Source", "str"), ("Target", "str"),
-                                            ("Offset", "vec:float"), ("Type", "str")], []),
-    ("Output_GetSubjectParamNames", False, [("Names", "vec:ss")], []),
-    ("Output_GetSubjectParamDetails", False, [("Value", "float"), ("DefaultValue", "float"), ("Unit", "str"),
-                                              ("Required", "bool")], []),
-    ("Output_GetObject", False, [("ID", "unsigned long long"), ("Type", "str")], []),
-    ("Output_GetObjectList", False, [("IDList", "vec:ull"), ("TypeList", "vec:ss")], []),
-    ("Output_GetIntegerList", False, [("Integers", "vec:int")], []),
-    ("Output_GetString", False, [("Str", "str")], []),
-    ("Output_GetAttribute", False, [("Type", "int"), ("Editable", "bool"), ("Str", "str")], []),
-    ("Output_GetStringList", False, [("Strings", "vec:ss")], []),
-    ("Output_GetInteger", False, [("Value", "int")], []),
-    ("Output_GetUnsignedLong", False, [("Value", "unsigned long long")], []),
-    ("Output_GetUnsignedLongList", False, [("ValueList", "vec:ull")], []),
-    ("Output_GetFloat", False, [("Value", "float")], []),
-    ("Output_GetTakeInfo", False, [("Name", "str"), ("Desc", "str"), ("Notes", "str")], []),
-    ("Output_CircleFitSettings", True, [("Enabled", "bool"), ("NumThreads", "int"),
-                                        ("EnableVideoCentroids", "bool")], []),
-    ("Output_ReconstructSettings", True, [
-        ("EnvironmentalDriftTolerance", "double"), ("MinCamsToStartTrajectory", "unsigned int"),
-        ("MinCamsToContinueTrajectory", "unsigned int"), ("ReconMinSeparation", "double"),
-        ("MinCentroidRadius", "double"), ("MaxCentroidRadius", "double"), ("MinReconstructionRadius", "double"),
-        ("MaxReconstructionRadius", "double"), ("FitMethod", "str"), ("PredicationMatchFactor", "double"),
-        ("MinTrajectoryLength", "unsigned int"), ("StartupError", "double"), ("PredicationError", "double"),
-        ("ComputeRadius", "bool"), ("MinVolumeX", "double"), ("MinVolumeY", "double"), ("MinVolumeZ", "double"),
-        ("MaxVolumeX", "double"), ("MaxVolumeY", "double"), ("MaxVolumeZ", "double"), ("NumThreads", "int")], []),
-    ("Output_LabelingSettings", True, [
-        ("UseLabelingClusters", "bool"), ("LabelCompletenessEntranceThreshold", "double"),
-        ("UseRobustBooting", "bool"), ("BootingQuality", "double"), ("BootingVersusTracking", "double"),
-        ("TrackingQuality", "double"), ("SmoothingFactor", "double"), ("SinglePassLabel", "bool"),
-        ("NumThreads", "int")], []),
-    ("Output_OcclusionFixingSettings", True, [("Enabled", "bool"), ("ApplyFixedMarkers", "bool"),
-                                              ("MarkerSmoothing", "double"), ("DataFidelity", "double"),
-                                              ("TransitionTime", "double")], []),
-    ("Output_SolvingSettings", True, [("PriorImportance", "double"), ("MeanPoseRatio", "double"),
-                                      ("NumThreads", "int"), ("ExtrapolateFingers", "bool"),
-                                      ("FingerMultiplier", "double")], []),
-    ("Output_LabelingSubjectCalibrationSettings", True, [
-        ("RestImportance", "float"), ("MarkerImportance", "float"), ("SegmentImportance", "float"),
-        ("Quality", "str"), ("StatsMode", "str"), ("CalibrationMode", "str"), ("ActiveFrames", "int"),
-        ("AutoSaveZSK", "bool"), ("AutoSavePreCalHDF", "bool"), ("OverwriteRangeTemplates", "bool"),
-        ("ShowCovariance", "bool")], []),
-    ("Output_LabelROMSettings", True, [("StandardDeviation", "float"), ("SeparationDistance", "float")], []),
-]
+# Every record in table order: name, its fields in order as "Field:kind" (a kind letter of KINDS, or
+# "v" and an element letter of ELEMENTS for a vector), and its member functions after "()".
+# Records marked "+" are constructible by scripts.
+TABLE = """
++Type_Parameter Name:s Value:s
+Output_Result Result:e ResultString:s () Error
+Output_ProcessRequest OutputParameters:vp
+Output_GetServerInfo Program:s MajorVersion:u MinorVersion:u PointVersion:u ReleaseType:s
+Output_GetCommandList Commands:vs
+Output_GetCommandInfo Name:s Description:s InputParameters:vp OutputParameters:vp () DefaultOutputString
+Output_GetSceneName Name:s Path:s
+Output_GetSubjectNames Names:vs Models:vs Active:vb
+Output_GetMarkerNames Names:vs
+Output_HasTrajectory Exists:b
+Output_GetTrajectory X:vd Y:vd Z:vd E:vb
+Output_GetTrajectoryAtFrame X:d Y:d Z:d E:b
+Output_GetBoneNames Names:vs
+Output_GetRootBone Name:s
+Output_GetBoneDetails Parent:s Children:vs
+Output_GetConstraintNames Names:vs
+Output_GetConstraintDetails Active:b Source:s Target:s Offset:vf Type:s
+Output_GetSubjectParamNames Names:vs
+Output_GetSubjectParamDetails Value:f DefaultValue:f Unit:s Required:b
+Output_GetObject ID:q Type:s
+Output_GetObjectList IDList:vq TypeList:vs
+Output_GetIntegerList Integers:vi
+Output_GetString Str:s
+Output_GetAttribute Type:i Editable:b Str:s
+Output_GetStringList Strings:vs
+Output_GetInteger Value:i
+Output_GetUnsignedLong Value:q
+Output_GetUnsignedLongList ValueList:vq
+Output_GetFloat Value:f
+Output_GetTakeInfo Name:s Desc:s Notes:s
++Output_CircleFitSettings Enabled:b NumThreads:i EnableVideoCentroids:b
++Output_ReconstructSettings EnvironmentalDriftTolerance:d MinCamsToStartTrajectory:u MinCamsToContinueTrajectory:u
+  ReconMinSeparation:d MinCentroidRadius:d MaxCentroidRadius:d MinReconstructionRadius:d MaxReconstructionRadius:d
+  FitMethod:s PredicationMatchFactor:d MinTrajectoryLength:u StartupError:d PredicationError:d ComputeRadius:b
+  MinVolumeX:d MinVolumeY:d MinVolumeZ:d MaxVolumeX:d MaxVolumeY:d MaxVolumeZ:d NumThreads:i
++Output_LabelingSettings UseLabelingClusters:b LabelCompletenessEntranceThreshold:d UseRobustBooting:b
+  BootingQuality:d BootingVersusTracking:d TrackingQuality:d SmoothingFactor:d SinglePassLabel:b NumThreads:i
++Output_OcclusionFixingSettings Enabled:b ApplyFixedMarkers:b MarkerSmoothing:d DataFidelity:d TransitionTime:d
++Output_SolvingSettings PriorImportance:d MeanPoseRatio:d NumThreads:i ExtrapolateFingers:b FingerMultiplier:d
++Output_LabelingSubjectCalibrationSettings RestImportance:f MarkerImportance:f SegmentImportance:f Quality:s
+  StatsMode:s CalibrationMode:s ActiveFrames:i AutoSaveZSK:b AutoSavePreCalHDF:b OverwriteRangeTemplates:b
+  ShowCovariance:b
++Output_LabelROMSettings StandardDeviation:f SeparationDistance:f
+"""
 
+
+def parse(table):
+    records = []
+    for line in table.replace("\n  ", " ").split("\n"):
+        if not line:
+            continue
+        head, *rest = line.split()
+        members = rest[rest.index("()") + 1:] if "()" in rest else []
+        fields = [tuple(f.split(":")) for f in rest if ":" in f]
+        records.append((head.lstrip("+"), head.startswith("+"), fields, members))
+    return records
+
+
+RECORDS = parse(TABLE)
 CREATABLE = [r for r in RECORDS if r[1]]
 FIELDS = [(name, field, kind) for name, _, fields, _ in RECORDS for field, kind in fields]
 CREATABLE_FIELDS = [(name, field, kind) for name, made, fields, _ in RECORDS if made for field, kind in fields]
 
 
 def type_text(kind):
-    if kind == "enum":
-        return NS + "ResultCode::Enum"
-    if kind == "str":
-        return NS + "SafeString *"
-    if kind.startswith("vec:"):
-        element = VECTOR[kind[4:]]
+    if kind.startswith("v"):
+        element = ELEMENTS[kind[1]]
         return f"std::vector< {element},std::allocator< {element} > > *"
-    return kind
+    return KINDS[kind]
 
 
 def fn(name):
@@ -118,11 +109,6 @@ def raises(exception, text, function, *args):
     with pytest.raises(exception) as caught:
         function(*args)
     assert str(caught.value) == text
-
-
-def make(classes, name):
-    """A new record of a constructible class, held by an instance of its script class."""
-    return classes[name]()
 
 
 def text(value):
@@ -199,31 +185,30 @@ def test_value_argument_is_checked(name, field, kind):
     function = f"{name}_{field}_set"
     message = f"in method '{function}', argument 2 of type '{type_text(kind)}'"
     raises(TypeError, message, fn(function), None, "3")
-    if kind in ("str",) or kind.startswith("vec:"):
+    if kind == "s" or kind.startswith("v"):
         raises(ValueError, "invalid null reference " + message, fn(function), None, None)
         raises(TypeError, message, fn(function), None, 3)
-        if kind.startswith("vec:"):
+        if kind.startswith("v"):
             raises(TypeError, message, fn(function), None, text("x"))
     else:
         raises(TypeError, message, fn(function), None, None)
 
 
 # (Vector values come only from records that a script cannot construct, so they are left out.)
-@pytest.mark.parametrize("name,field,kind", [f for f in FIELDS if not f[2].startswith("vec:")])
+@pytest.mark.parametrize("name,field,kind", [f for f in FIELDS if not f[2].startswith("v")])
 def test_setter_on_a_null_record_stores_nothing(name, field, kind):
-    value = text("x") if kind == "str" else {"bool": True, "float": 1.5, "double": 1.5}.get(kind, 1)
+    value = text("x") if kind == "s" else {"b": True, "f": 1.5, "d": 1.5}.get(kind, 1)
     assert fn(f"{name}_{field}_set")(None, value) is None
 
 
 # ---- Field access on live records -------------------------------------------------------------
 
-SAMPLE = {"bool": [True, False], "int": [-5, 2147483647], "unsigned int": [0, 4294967295],
-          "float": [0.5, -2.0], "double": [1e300, -0.25], "enum": [1003, -1]}
+SAMPLE = {"b": [True, False], "i": [-5, 2147483647], "u": [0, 4294967295], "f": [0.5, -2.0], "d": [1e300, -0.25]}
 
 
-@pytest.mark.parametrize("name,field,kind", [f for f in CREATABLE_FIELDS if f[2] != "str"])
+@pytest.mark.parametrize("name,field,kind", [f for f in CREATABLE_FIELDS if f[2] != "s"])
 def test_scalar_fields_round_trip(registered_classes, name, field, kind):
-    record = make(registered_classes, name)
+    record = registered_classes[name]()
     setter, getter = fn(f"{name}_{field}_set"), fn(f"{name}_{field}_get")
     assert getter(record) == 0 and type(getter(record)) is type(SAMPLE[kind][0])  # new_ zero-fills
     for value in SAMPLE[kind]:
@@ -235,9 +220,9 @@ def test_scalar_fields_round_trip(registered_classes, name, field, kind):
     assert getter(record) == SAMPLE[kind][-1]
 
 
-@pytest.mark.parametrize("name,field,kind", [f for f in CREATABLE_FIELDS if f[2] == "str"])
+@pytest.mark.parametrize("name,field,kind", [f for f in CREATABLE_FIELDS if f[2] == "s"])
 def test_text_fields_are_borrowed_from_the_record(registered_classes, name, field, kind):
-    record = make(registered_classes, name)
+    record = registered_classes[name]()
     setter, getter = fn(f"{name}_{field}_set"), fn(f"{name}_{field}_get")
     first = getter(record)
     assert m.SafeString_IsEmpty(first) and m.SafeString_Value(first) == ""
@@ -253,27 +238,19 @@ def test_text_fields_are_borrowed_from_the_record(registered_classes, name, fiel
         with pytest.raises((TypeError, ValueError)):
             setter(record, bad)
     assert m.SafeString_Value(getter(record)) == "héllo"
-
-
-def test_text_fields_are_independent(registered_classes):
-    record = make(registered_classes, "Output_LabelingSubjectCalibrationSettings")
-    fields = ["Quality", "StatsMode", "CalibrationMode"]
-    for field in fields:
-        fn(f"Output_LabelingSubjectCalibrationSettings_{field}_set")(record, text(field.lower()))
-    got = [m.SafeString_Value(fn(f"Output_LabelingSubjectCalibrationSettings_{f}_get")(record)) for f in fields]
-    assert got == [f.lower() for f in fields]
-    # Copying one text field into another record's field copies the text.
-    other = make(registered_classes, "Type_Parameter")
-    m.Type_Parameter_Name_set(other, m.Output_LabelingSubjectCalibrationSettings_StatsMode_get(record))
-    assert m.SafeString_Value(m.Type_Parameter_Name_get(other)) == "statsmode"
+    # Into another record, the text is copied.
+    other = registered_classes["Type_Parameter"]()
+    m.Type_Parameter_Value_set(other, again)
+    assert m.SafeString_Value(m.Type_Parameter_Value_get(other)) == "héllo"
+    assert int(m.Type_Parameter_Value_get(other).this) != int(again.this)
 
 
 def test_fields_of_one_record_do_not_overlap(registered_classes):
-    record = make(registered_classes, "Output_ReconstructSettings")
-    fields = [(f, k) for n, f, k in CREATABLE_FIELDS if n == "Output_ReconstructSettings" and k != "str"]
+    record = registered_classes["Output_ReconstructSettings"]()
+    fields = [(f, k) for n, f, k in CREATABLE_FIELDS if n == "Output_ReconstructSettings" and k != "s"]
     values = {}
     for i, (field, kind) in enumerate(fields):
-        values[field] = {"bool": i % 2 == 0, "double": i + 0.5}.get(kind, i + 1)
+        values[field] = {"b": i % 2 == 0, "d": i + 0.5}.get(kind, i + 1)
         fn(f"Output_ReconstructSettings_{field}_set")(record, values[field])
     assert {f: fn(f"Output_ReconstructSettings_{f}_get")(record) for f, _ in fields} == values
 
@@ -283,7 +260,7 @@ def test_fields_of_one_record_do_not_overlap(registered_classes):
 
 @pytest.mark.parametrize("name", [r[0] for r in CREATABLE if r[0] != "Type_Parameter"])
 def test_base_functions_accept_any_record(registered_classes, name):
-    record = make(registered_classes, name)
+    record = registered_classes[name]()
     assert m.Output_Result_Result_get(record) == 0 and m.Output_Result_Error(record) is False
     m.Output_Result_Result_set(record, 1003)
     assert m.Output_Result_Result_get(record) == 1003 and m.Output_Result_Error(record) is True
@@ -294,7 +271,7 @@ def test_base_functions_accept_any_record(registered_classes, name):
 
 
 def test_type_parameter_is_not_an_output_record(registered_classes):
-    parameter = make(registered_classes, "Type_Parameter")
+    parameter = registered_classes["Type_Parameter"]()
     raises(TypeError, f"in method 'Output_Result_Error', argument 1 of type '{NS}Output_Result const *'",
            m.Output_Result_Error, parameter)
 
