@@ -116,37 +116,41 @@ inline constexpr auto Get = [](typename MemberOf<decltype(Member)>::Class* recor
 template <class F>
 struct SelfOf;
 template <class R, class C>
-struct SelfOf<R (C::*)()> : std::type_identity<Self<C>> {};
+struct SelfOf<R (C::*)()> : std::type_identity<Self<C>> {
+  using Class = C;
+};
 template <class R, class C>
-struct SelfOf<R (C::*)() const> : std::type_identity<ConstSelf<C>> {};
+struct SelfOf<R (C::*)() const> : std::type_identity<ConstSelf<C>> {
+  using Class = C;
+};
 
 template <class X>
 inline constexpr auto Make = [] { return Owned<X, PointerOwn | PointerNoShadow>{new X()}; };
 
-}  // namespace record
-
 // A field: its setter and getter.
 template <Text Name, auto Member>
 struct Field {
-  using Class = typename record::MemberOf<decltype(Member)>::Class;
-  using Type = typename record::MemberOf<decltype(Member)>::Type;
+  using Class = typename MemberOf<decltype(Member)>::Class;
+  using Type = typename MemberOf<decltype(Member)>::Type;
   template <Text X>
-  using Lines = Table<Fn<cat(X, "_", Name, "_set"), Tuple, record::Set<Member>, record::Target<Class>,
-                         typename record::KindOf<Type>::type>,
-                      Fn<cat(X, "_", Name, "_get"), Object, record::Get<Member>, Self<Class>>>;
+  using Lines = Table<Fn<cat(X, "_", Name, "_set"), Tuple, Set<Member>, Target<Class>,
+                         typename KindOf<Type>::type>,
+                      Fn<cat(X, "_", Name, "_get"), Object, Get<Member>, Self<Class>>>;
 };
 
 // A member function without arguments.
 template <Text Name, auto Function>
 struct Method {
+  using Class = typename SelfOf<decltype(Function)>::Class;
   template <Text X>
-  using Lines = Fn<cat(X, "_", Name), Object, Function, typename record::SelfOf<decltype(Function)>::type>;
+  using Lines = Fn<cat(X, "_", Name), Object, Function, typename SelfOf<decltype(Function)>::type>;
 };
 
 // A record that scripts receive from the client: delete_X, its members, X_swigregister.
 template <class X, class... Members>
 struct Record {
-  static constexpr auto name = record::ClassName<X>;
+  static_assert((std::is_same_v<typename Members::Class, X> && ...), "a member of another class");
+  static constexpr auto name = ClassName<X>;
   static constexpr auto defs = Join(Fn<cat("delete_", name), Object, Delete<X>, Disowned<X>>::defs,
                                     Members::template Lines<name>::defs..., Register<name, TypeOf<X>>::defs);
 };
@@ -154,9 +158,11 @@ struct Record {
 // A record that scripts also construct: new_X (zero-filled) in front and X_swiginit at the end.
 template <class X, class... Members>
 struct Creatable {
-  static constexpr auto name = record::ClassName<X>;
-  static constexpr auto defs = Join(Fn<cat("new_", name), NoArgs, record::Make<X>>::defs,
-                                    Record<X, Members...>::defs, Init<name>::defs);
+  static constexpr auto name = ClassName<X>;
+  static constexpr auto defs = Join(Fn<cat("new_", name), NoArgs, Make<X>>::defs, Record<X, Members...>::defs,
+                                    Init<name>::defs);
 };
+
+}  // namespace record
 
 }  // namespace client3

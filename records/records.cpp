@@ -8,6 +8,7 @@ namespace client3 {
 namespace {
 
 using namespace ZarvoSDKClientCPP;
+using namespace record;
 
 using Functions = Table<
     Creatable<Type_Parameter,
