@@ -68,7 +68,7 @@ public:
   std::vector<Type_Parameter> InputParameters;
   std::vector<Type_Parameter> OutputParameters;
 
-  std::string DefaultOutputString() const;
+  std::string DefaultOutputString();
 };
 
 // Query results.

@@ -1,0 +1,369 @@
+"""The record families: function table, calling conventions, argument checks and field access."""
+import shutil
+import subprocess
+import textwrap
+from pathlib import Path
+
+import pytest
+
+import _Client3 as m
+
+NS = "ZarvoSDKClientCPP::"
+KINDS = {"i": "int", "u": "unsigned int", "q": "unsigned long long", "b": "bool", "f": "float", "d": "double",
+         "e": NS + "ResultCode::Enum", "s": NS + "SafeString *"}
+ELEMENTS = {"b": "bool", "i": "int", "q": "unsigned long long", "f": "float", "d": "double",
+            "s": NS + "SafeString", "p": NS + "Type_Parameter"}
+
+# Every record in table order: name, its fields in order as "Field:kind" (a kind letter of KINDS, or
+# "v" and an element letter of ELEMENTS for a vector), and its member functions after "()".
+# Records marked "+" are constructible by scripts.
+TABLE = """
++Type_Parameter Name:s Value:s
+Output_Result Result:e ResultString:s () Error
+Output_ProcessRequest OutputParameters:vp
+Output_GetServerInfo Program:s MajorVersion:u MinorVersion:u PointVersion:u ReleaseType:s
+Output_GetCommandList Commands:vs
+Output_GetCommandInfo Name:s Description:s InputParameters:vp OutputParameters:vp () DefaultOutputString
+Output_GetSceneName Name:s Path:s
+Output_GetSubjectNames Names:vs Models:vs Active:vb
+Output_GetMarkerNames Names:vs
+Output_HasTrajectory Exists:b
+Output_GetTrajectory X:vd Y:vd Z:vd E:vb
+Output_GetTrajectoryAtFrame X:d Y:d Z:d E:b
+Output_GetBoneNames Names:vs
+Output_GetRootBone Name:s
+Output_GetBoneDetails Parent:s Children:vs
+Output_GetConstraintNames Names:vs
+Output_GetConstraintDetails Active:b Source:s Target:s Offset:vf Type:s
+Output_GetSubjectParamNames Names:vs
+Output_GetSubjectParamDetails Value:f DefaultValue:f Unit:s Required:b
+Output_GetObject ID:q Type:s
+Output_GetObjectList IDList:vq TypeList:vs
+Output_GetIntegerList Integers:vi
+Output_GetString Str:s
+Output_GetAttribute Type:i Editable:b Str:s
+Output_GetStringList Strings:vs
+Output_GetInteger Value:i
+Output_GetUnsignedLong Value:q
+Output_GetUnsignedLongList ValueList:vq
+Output_GetFloat Value:f
+Output_GetTakeInfo Name:s Desc:s Notes:s
++Output_CircleFitSettings Enabled:b NumThreads:i EnableVideoCentroids:b
++Output_ReconstructSettings EnvironmentalDriftTolerance:d MinCamsToStartTrajectory:u MinCamsToContinueTrajectory:u
+  ReconMinSeparation:d MinCentroidRadius:d MaxCentroidRadius:d MinReconstructionRadius:d MaxReconstructionRadius:d
+  FitMethod:s PredicationMatchFactor:d MinTrajectoryLength:u StartupError:d PredicationError:d ComputeRadius:b
+  MinVolumeX:d MinVolumeY:d MinVolumeZ:d MaxVolumeX:d MaxVolumeY:d MaxVolumeZ:d NumThreads:i
++Output_LabelingSettings UseLabelingClusters:b LabelCompletenessEntranceThreshold:d UseRobustBooting:b
+  BootingQuality:d BootingVersusTracking:d TrackingQuality:d SmoothingFactor:d SinglePassLabel:b NumThreads:i
++Output_OcclusionFixingSettings Enabled:b ApplyFixedMarkers:b MarkerSmoothing:d DataFidelity:d TransitionTime:d
++Output_SolvingSettings PriorImportance:d MeanPoseRatio:d NumThreads:i ExtrapolateFingers:b FingerMultiplier:d
++Output_LabelingSubjectCalibrationSettings RestImportance:f MarkerImportance:f SegmentImportance:f Quality:s
+  StatsMode:s CalibrationMode:s ActiveFrames:i AutoSaveZSK:b AutoSavePreCalHDF:b OverwriteRangeTemplates:b
+  ShowCovariance:b
++Output_LabelROMSettings StandardDeviation:f SeparationDistance:f
+"""
+
+
+def parse(table):
+    records = []
+    for line in table.replace("\n  ", " ").split("\n"):
+        if not line:
+            continue
+        head, *rest = line.split()
+        members = rest[rest.index("()") + 1:] if "()" in rest else []
+        fields = [tuple(f.split(":")) for f in rest if ":" in f]
+        records.append((head.lstrip("+"), head.startswith("+"), fields, members))
+    return records
+
+
+RECORDS = parse(TABLE)
+CREATABLE = [r for r in RECORDS if r[1]]
+FIELDS = [(name, field, kind) for name, _, fields, _ in RECORDS for field, kind in fields]
+CREATABLE_FIELDS = [(name, field, kind) for name, made, fields, _ in RECORDS if made for field, kind in fields]
+
+
+def type_text(kind):
+    if kind.startswith("v"):
+        element = ELEMENTS[kind[1]]
+        return f"std::vector< {element},std::allocator< {element} > > *"
+    return KINDS[kind]
+
+
+def fn(name):
+    return getattr(m, name)
+
+
+def family(name, made, fields, methods):
+    names = ["new_" + name] if made else []
+    names.append("delete_" + name)
+    for field, _ in fields:
+        names += [f"{name}_{field}_set", f"{name}_{field}_get"]
+    names += [f"{name}_{method}" for method in methods]
+    names.append(name + "_swigregister")
+    if made:
+        names.append(name + "_swiginit")
+    return names
+
+
+def raises(exception, text, function, *args):
+    with pytest.raises(exception) as caught:
+        function(*args)
+    assert str(caught.value) == text
+
+
+def text(value):
+    return m.new_SafeString(value)
+
+
+# ---- The table ----------------------------------------------------------------------------------
+
+
+def test_record_functions_are_listed_in_table_order():
+    listed = [key for key, value in vars(m).items() if callable(value)]
+    expected = [n for record in RECORDS for n in family(*record)]
+    start = listed.index("new_Type_Parameter")
+    assert listed[start:start + len(expected)] == expected
+    assert len(expected) == 328
+
+
+@pytest.mark.parametrize("record", RECORDS, ids=[r[0] for r in RECORDS])
+def test_calling_conventions_and_argument_counts(record):
+    name, made, fields, methods = record
+    for function in family(*record):
+        if function.startswith("new_"):
+            raises(TypeError, f"_Client3.{function}() takes no arguments (1 given)", fn(function), 1)
+        elif function.endswith("_set"):
+            raises(TypeError, f"{function} expected 2 arguments, got 1", fn(function), None)
+            raises(TypeError, f"{function} expected 2 arguments, got 3", fn(function), None, 1, 2)
+        elif function.endswith("_swiginit"):
+            raises(TypeError, "swiginit expected 2 arguments, got 1", fn(function), None)
+        else:
+            raises(TypeError, f"_Client3.{function}() takes exactly one argument (0 given)", fn(function))
+
+
+# ---- Argument 1 -------------------------------------------------------------------------------
+
+
+@pytest.mark.parametrize("name,field,kind", FIELDS)
+def test_record_argument_is_checked(name, field, kind):
+    stranger = text("x")  # a proxy of another type
+    for suffix in ("_set", "_get"):
+        function = f"{name}_{field}{suffix}"
+        message = f"in method '{function}', argument 1 of type '{NS}{name} *'"
+        args = (stranger, 0) if suffix == "_set" else (stranger,)
+        raises(TypeError, message, fn(function), *args)
+        args = (7, 0) if suffix == "_set" else (7,)
+        raises(TypeError, message, fn(function), *args)
+    # A getter cannot read a null record.
+    raises(ValueError, f"invalid null reference in method '{name}_{field}_get', argument 1 of type '{NS}{name} *'",
+           fn(f"{name}_{field}_get"), None)
+
+
+@pytest.mark.parametrize("function,type_text_", [
+    ("Output_Result_Error", NS + "Output_Result const *"),
+    ("Output_GetCommandInfo_DefaultOutputString", NS + "Output_GetCommandInfo *"),
+])
+def test_member_functions_check_their_record(function, type_text_):
+    message = f"in method '{function}', argument 1 of type '{type_text_}'"
+    raises(TypeError, message, fn(function), 1)
+    raises(TypeError, message, fn(function), text("x"))
+    raises(ValueError, "invalid null reference " + message, fn(function), None)
+
+
+@pytest.mark.parametrize("record", RECORDS, ids=[r[0] for r in RECORDS])
+def test_delete_accepts_none_and_refuses_other_types(record):
+    name = record[0]
+    assert fn("delete_" + name)(None) is None
+    raises(TypeError, f"in method 'delete_{name}', argument 1 of type '{NS}{name} *'", fn("delete_" + name), 3)
+
+
+# ---- Argument 2 -------------------------------------------------------------------------------
+
+
+@pytest.mark.parametrize("name,field,kind", FIELDS)
+def test_value_argument_is_checked(name, field, kind):
+    function = f"{name}_{field}_set"
+    message = f"in method '{function}', argument 2 of type '{type_text(kind)}'"
+    raises(TypeError, message, fn(function), None, "3")
+    if kind == "s" or kind.startswith("v"):
+        raises(ValueError, "invalid null reference " + message, fn(function), None, None)
+        raises(TypeError, message, fn(function), None, 3)
+        if kind.startswith("v"):
+            raises(TypeError, message, fn(function), None, text("x"))
+    else:
+        raises(TypeError, message, fn(function), None, None)
+
+
+# (Vector values come only from records that a script cannot construct, so they are left out.)
+@pytest.mark.parametrize("name,field,kind", [f for f in FIELDS if not f[2].startswith("v")])
+def test_setter_accepts_a_null_record(name, field, kind):
+    value = text("x") if kind == "s" else {"b": True, "f": 1.5, "d": 1.5}.get(kind, 1)
+    assert fn(f"{name}_{field}_set")(None, value) is None
+
+
+# ---- Field access on live records -------------------------------------------------------------
+
+SAMPLE = {"b": [True, False], "i": [-5, 2147483647], "u": [0, 4294967295], "f": [0.5, -2.0], "d": [1e300, -0.25]}
+
+
+@pytest.mark.parametrize("name,field,kind", [f for f in CREATABLE_FIELDS if f[2] != "s"])
+def test_scalar_fields_round_trip(registered_classes, name, field, kind):
+    record = registered_classes[name]()
+    setter, getter = fn(f"{name}_{field}_set"), fn(f"{name}_{field}_get")
+    assert getter(record) == 0 and type(getter(record)) is type(SAMPLE[kind][0])  # new_ zero-fills
+    for value in SAMPLE[kind]:
+        assert setter(record, value) is None
+        assert getter(record) == value and type(getter(record)) is type(value)
+    # A refused value leaves the field as it was.
+    with pytest.raises(TypeError):
+        setter(record, "3")
+    assert getter(record) == SAMPLE[kind][-1]
+
+
+@pytest.mark.parametrize("name,field,kind", [f for f in CREATABLE_FIELDS if f[2] == "s"])
+def test_text_fields_are_borrowed_from_the_record(registered_classes, name, field, kind):
+    record = registered_classes[name]()
+    setter, getter = fn(f"{name}_{field}_set"), fn(f"{name}_{field}_get")
+    first = getter(record)
+    assert m.SafeString_IsEmpty(first) and m.SafeString_Value(first) == ""
+    assert first.this.own() is False
+    setter(record, text("héllo"))
+    again = getter(record)
+    assert m.SafeString_Value(again) == "héllo"
+    assert int(again.this) == int(first.this)  # the same field, not a copy
+    # The field proxy works as a source, including for the field itself.
+    setter(record, again)
+    assert m.SafeString_Value(getter(record)) == "héllo"
+    for bad in (None, "text", 3):
+        with pytest.raises((TypeError, ValueError)):
+            setter(record, bad)
+    assert m.SafeString_Value(getter(record)) == "héllo"
+    # Into another record, the text is copied.
+    other = registered_classes["Type_Parameter"]()
+    m.Type_Parameter_Value_set(other, again)
+    assert m.SafeString_Value(m.Type_Parameter_Value_get(other)) == "héllo"
+    assert int(m.Type_Parameter_Value_get(other).this) != int(again.this)
+
+
+def test_fields_of_one_record_do_not_overlap(registered_classes):
+    record = registered_classes["Output_ReconstructSettings"]()
+    fields = [(f, k) for n, f, k in CREATABLE_FIELDS if n == "Output_ReconstructSettings" and k != "s"]
+    values = {}
+    for i, (field, kind) in enumerate(fields):
+        values[field] = {"b": i % 2 == 0, "d": i + 0.5}.get(kind, i + 1)
+        fn(f"Output_ReconstructSettings_{field}_set")(record, values[field])
+    assert {f: fn(f"Output_ReconstructSettings_{f}_get")(record) for f, _ in fields} == values
+
+
+# ---- Output_Result on every record ------------------------------------------------------------
+
+
+@pytest.mark.parametrize("name", [r[0] for r in CREATABLE if r[0] != "Type_Parameter"])
+def test_base_functions_accept_any_record(registered_classes, name):
+    record = registered_classes[name]()
+    assert m.Output_Result_Result_get(record) == 0 and m.Output_Result_Error(record) is False
+    m.Output_Result_Result_set(record, 1003)
+    assert m.Output_Result_Result_get(record) == 1003 and m.Output_Result_Error(record) is True
+    m.Output_Result_Result_set(record, 0)
+    assert m.Output_Result_Error(record) is False
+    m.Output_Result_ResultString_set(record, text("why"))
+    assert m.SafeString_Value(m.Output_Result_ResultString_get(record)) == "why"
+
+
+def test_type_parameter_is_not_an_output_record(registered_classes):
+    parameter = registered_classes["Type_Parameter"]()
+    raises(TypeError, f"in method 'Output_Result_Error', argument 1 of type '{NS}Output_Result const *'",
+           m.Output_Result_Error, parameter)
+
+
+# ---- Construction and ownership ---------------------------------------------------------------
+
+
+@pytest.mark.parametrize("name", [r[0] for r in CREATABLE])
+def test_new_returns_an_owning_bare_proxy(registered_classes, name):
+    bare = fn("new_" + name)()
+    assert type(bare).__name__ == "SwigPyObject" and bare.own() is True
+    assert f"'{NS}{name} *'" in repr(bare)
+    instance = registered_classes[name]()
+    assert instance.this.own() is True
+    assert fn("delete_" + name)(bare) is None
+    assert bare.own() is False  # disowned: its release destroys nothing a second time
+
+
+def test_records_are_released_without_leaks():
+    code = textwrap.dedent("""
+        import sys; sys.path.insert(0, %r)
+        import _Client3 as m, companion
+        classes = companion.register()
+        for name in %r:
+            for _ in range(3):
+                record = classes[name]()
+                getattr(m, "delete_" + name)(getattr(m, "new_" + name)())
+        print("done")
+    """) % (str(Path(__file__).parent), [r[0] for r in CREATABLE])
+    from conftest import run_python
+    status, out, err = run_python(code)
+    assert status == 0, err
+    assert out == "done\n"  # no leak line
+
+
+# ---- DefaultOutputString ----------------------------------------------------------------------
+
+EMPTY_COMMAND = ("Cmd\nDoes it\n----------------\nInput Parameters\n----------------\nNone\n"
+                 "-----------------\nOutput Parameters\n-----------------\nNone\n")
+
+
+def test_default_output_string_refuses_a_null_record():
+    # No script can make an Output_GetCommandInfo itself, so only a null one is at hand here; the
+    # layout with parameters is checked natively below.
+    raises(ValueError, "invalid null reference in method 'Output_GetCommandInfo_DefaultOutputString', "
+           f"argument 1 of type '{NS}Output_GetCommandInfo *'", m.Output_GetCommandInfo_DefaultOutputString, None)
+
+
+DRIVER = r"""
+#include <cstdio>
+#include <string>
+#include "ZarvoSDKClientCPP/Outputs.h"
+using namespace ZarvoSDKClientCPP;
+static Type_Parameter P(const char* n, const char* v) {
+  Type_Parameter p; p.Name = SafeString(VStringFactory::Instance(), n);
+  if (v) p.Value = SafeString(VStringFactory::Instance(), v);
+  return p;
+}
+static void Show(Output_GetCommandInfo& c) { std::string s = c.DefaultOutputString(); std::fwrite(s.data(), 1, s.size(), stdout); std::fputs("@\n", stdout); }
+int main() {
+  Output_GetCommandInfo c;
+  c.Name = SafeString("Cmd"); c.Description = SafeString("Does it");
+  Show(c);
+  c.InputParameters = {P("Frame", "12"), P("Subject", nullptr)};
+  Show(c);
+  c.OutputParameters = {P("LongerName", "x")};
+  Show(c);
+  c.InputParameters.clear();
+  c.Name = SafeString(); c.Description = SafeString();
+  Show(c);
+}
+"""
+
+
+def test_default_output_string_layout(tmp_path):
+    compiler = shutil.which("c++") or shutil.which("g++")
+    if not compiler:
+        pytest.skip("no C++ compiler")
+    root = Path(__file__).resolve().parent.parent
+    (tmp_path / "driver.cpp").write_text(DRIVER)
+    program = tmp_path / "driver"
+    subprocess.run([compiler, "-std=c++20", "-I", str(root / "include"), str(tmp_path / "driver.cpp"),
+                    str(root / "records" / "command_info.cpp"), str(root / "library" / "StringFactory.cpp"),
+                    "-o", str(program)], check=True)
+    shown = subprocess.run([str(program)], capture_output=True, text=True, check=True).stdout.split("@\n")
+    dashes16, dashes17 = "-" * 16, "-" * 17
+    assert shown[0] == EMPTY_COMMAND
+    assert shown[1] == "\n".join(["Cmd", "Does it", dashes16, "Input Parameters", dashes16, "Frame     12",
+                                  "Subject   ", dashes17, "Output Parameters", dashes17, "None", ""])
+    # One column for both lists: the longest name of either, plus three.
+    assert shown[2] == "\n".join(["Cmd", "Does it", dashes16, "Input Parameters", dashes16, "Frame        12",
+                                  "Subject      ", dashes17, "Output Parameters", dashes17, "LongerName   x", ""])
+    assert shown[3] == "\n".join(["", "", dashes16, "Input Parameters", dashes16, "None", dashes17,
+                                  "Output Parameters", dashes17, "LongerName   x", ""])
+    assert shown[4] == ""
