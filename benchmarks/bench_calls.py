@@ -36,6 +36,8 @@ def main():
     for label, statement in cases:
         measure(label, statement, scope)
     m.delete_SafeString(text)
+    if scope["r"] is not None:
+        m.delete_Output_CircleFitSettings(scope["r"])
 
 
 if __name__ == "__main__":
