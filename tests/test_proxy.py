@@ -265,12 +265,6 @@ def test_destroy_runs_with_the_pending_error_set_aside(safe_string_class):
     assert seen == [None]
 
 
-# Imports _Client3 (unregistered) and the peer in a fresh interpreter.
-PEER_SCRIPT = """import importlib.util, _Client3
-spec = importlib.util.spec_from_file_location("_Client3Peer", {path!r})
-peer = importlib.util.module_from_spec(spec)
-spec.loader.exec_module(peer)
-"""
 SAFE_STRING_NAME = "std::vector< ZarvoSDKClientCPP::SafeString >::value_type *"
 
 
@@ -302,7 +296,7 @@ SAFE_STRING_NAME = "std::vector< ZarvoSDKClientCPP::SafeString >::value_type *"
     ],
 )
 def test_leak_line(peer, body, output):
-    rc, out, err = run_python(PEER_SCRIPT.format(path=peer.__file__) + body)
+    rc, out, err = run_python("import _Client3\n" + build.import_lines(peer.__file__) + body)
     assert (rc, err) == (0, "")
     assert out == output
 

@@ -4,10 +4,11 @@ The peer compiles the runtime sources of this repository together with tests/pee
 its own shared object, so it carries its own copy of every runtime static, as any other module of
 the family would.
 """
+import importlib
 import importlib.machinery
-import importlib.util
 import os
 import subprocess
+import sys
 import sysconfig
 
 HERE = os.path.dirname(os.path.abspath(__file__))
@@ -41,10 +42,15 @@ def build(directory):
 
 def load(path):
     """Imports the peer module from `path` (its start-up joins the shared type ring)."""
-    spec = importlib.util.spec_from_file_location(NAME, path)
-    module = importlib.util.module_from_spec(spec)
-    spec.loader.exec_module(module)
-    return module
+    directory = os.path.dirname(path)
+    if directory not in sys.path:
+        sys.path.insert(0, directory)
+    return importlib.import_module(NAME)
+
+
+def import_lines(path):
+    """Script lines that import the peer from `path` as `peer` in another interpreter."""
+    return "import sys\nsys.path.insert(0, %r)\nimport %s as peer\n" % (os.path.dirname(path), NAME)
 
 
 _peer = None
