@@ -6,6 +6,7 @@ import pytest
 
 import _Client3
 import companion
+from conftest import run_python
 from peer import build
 
 SAFE_STRING = "_p_ZarvoSDKClientCPP__SafeString"
@@ -293,3 +294,52 @@ def test_type_query_cache_is_keyed_by_exact_text(peer):
     finally:
         del cache["std::vector< int > *"]
     assert peer.query("std::vector< int > *") == "_p_std__vectorT_int_std__allocatorT_int_t_t"
+
+
+# ---- Bad input from other modules and scripts, in a fresh interpreter ------------------------------
+
+CRASH_CASES = {
+    # A proxy may carry no descriptor; it is then accepted only where any type is.
+    "null descriptor": """
+proxy = peer.make(None, 16, 2)
+assert peer.convert(proxy, None, 0) == (0, 16, 0)
+assert peer.convert(proxy, "_p_ZarvoSDKClientCPP__SafeString", 0)[0] == -1
+try:
+    _Client3.SafeString_IsEmpty(proxy)
+except TypeError as error:
+    print(error)
+""",
+    # A registered class that cannot make instances: results cannot be made, and say so.
+    "class without creation slot": """
+_Client3.SafeString_swigregister(type(iter([])))
+try:
+    peer.make("_p_ZarvoSDKClientCPP__SafeString", 16, 0)
+except TypeError:
+    print("refused")
+""",
+}
+CRASH_OUTPUT = {
+    "null descriptor": "in method 'SafeString_IsEmpty', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'\n",
+    "class without creation slot": "refused\n",
+}
+
+
+@pytest.mark.parametrize(
+    "case",
+    [
+        pytest.param("null descriptor", marks=pytest.mark.xfail(
+            strict=True, reason="pointer conversion reads the mangled name of a proxy's null descriptor")),
+        pytest.param("class without creation slot", marks=pytest.mark.xfail(
+            strict=True, reason="a result is made by calling the registered type's null creation slot")),
+    ],
+)
+def test_bad_input_from_outside_does_not_crash(peer, case):
+    rc, out, err = run_python("import _Client3\n" + build.import_lines(peer.__file__) + CRASH_CASES[case])
+    assert (rc, out, err) == (0, CRASH_OUTPUT[case], "")
+
+
+@pytest.mark.parametrize("instance", [object(), int, 5])
+def test_swiginit_on_an_instance_without_a_dictionary_answers_none_with_the_error_pending(instance):
+    with pytest.raises(SystemError) as raised:
+        _Client3.SafeString_swiginit(instance, _Client3.new_SafeString())
+    assert raised.value.__cause__ is not None
