@@ -2,7 +2,6 @@
 // same descriptor table as _Client3, joins the shared type ring at import, and offers functions that
 // look inside its copy of the runtime: the ring, descriptors and cast lists, pointer conversion in
 // both directions, the type cache, packed values, and the text conversions.
-#include <cstdint>
 #include <cstring>
 
 #include "convert/text.h"
@@ -96,16 +95,17 @@ PyObject* Make(PyObject*, PyObject* args) {
   return NewPointerObj(nullptr, pointer, type, flags);
 }
 
-// convert(object, mangled name or None, flags) -> (code, address or None, own): ConvertPtr.
+// convert(object, mangled name or None, flags[, outputs]) -> (code, address or None, own):
+// ConvertPtr; with `outputs` false the conversion is asked for its code only.
 PyObject* Convert(PyObject*, PyObject* args) {
   PyObject *object, *name;
-  int flags;
-  if (!PyArg_ParseTuple(args, "OOi", &object, &name, &flags)) return nullptr;
+  int flags, outputs = 1;
+  if (!PyArg_ParseTuple(args, "OOi|p", &object, &name, &flags, &outputs)) return nullptr;
   TypeInfo* type;
   if (!RingType(name, &type)) return nullptr;
-  void* pointer = reinterpret_cast<void*>(std::uintptr_t{0xdead});
+  void* pointer = nullptr;
   int own = 0;
-  int code = ConvertPtr(object, &pointer, type, flags, &own);
+  int code = outputs ? ConvertPtr(object, &pointer, type, flags, &own) : ConvertPtr(object, nullptr, type, flags);
   if (code < 0) return Py_BuildValue("(iOi)", code, Py_None, own);
   PyObject* address = pointer ? Address(pointer) : (Py_INCREF(Py_None), Py_None);
   return Py_BuildValue("(iNi)", code, address, own);
