@@ -154,3 +154,22 @@ def test_to_string_refusals(code, exception):
     with pytest.raises(exception) as raised:
         _Client3.ToString(code)
     assert str(raised.value) == "in method 'ToString', argument 1 of type 'ZarvoSDKClientCPP::ResultCode::Enum'"
+
+
+def test_new_safe_string_from_a_character_pointer_proxy(peer):
+    import ctypes
+
+    text = ctypes.create_string_buffer(b"hello")
+    made = _Client3.new_SafeString(peer.make("_p_char", ctypes.addressof(text), 2))
+    assert type(made).__name__ == "SwigPyObject" and made.own() is True
+    assert isinstance(_Client3.SafeString_Value(made), str)
+
+
+@pytest.mark.xfail(strict=True, reason="None passes the character-pointer test as a null text, so the string "
+                   "form is chosen and must refuse the null reference; the overload error is raised instead")
+def test_new_safe_string_from_none_is_a_null_reference():
+    with pytest.raises(ValueError) as raised:
+        _Client3.new_SafeString(None)
+    assert str(raised.value) == (
+        "invalid null reference in method 'new_SafeString', argument 1 of type 'std::string const &'"
+    )
