@@ -149,7 +149,7 @@ SELF = "in method '{}', argument 1 of type 'ZarvoSDKClientCPP::SafeString const 
 
 @pytest.mark.parametrize("name", ["SafeString_IsEmpty", "SafeString_Value", "SafeString___str__", "SafeString___repr__"])
 @pytest.mark.parametrize("bad", [5, "text", b"text", object(), [], lambda: _Client3.new_SafeString().__class__])
-def test_wrong_self_argument(peer, name, bad):
+def test_wrong_self_argument(name, bad):
     bad = bad() if callable(bad) else bad
     with pytest.raises(TypeError) as raised:
         getattr(_Client3, name)(bad)
