@@ -4,7 +4,6 @@ import json
 import os
 import types
 
-
 import _Client3
 from conftest import run_python
 
