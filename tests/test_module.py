@@ -105,12 +105,11 @@ for name, function in vars(_Client3).items():
         continue
     for count in range(4):
         for index in range(len(samples())):
-            sample = samples()[index]
-            args = (sample,) * count
+            args = (samples()[index],) * count
             try:
                 function(*args)
             except SystemError as error:
-                problems.append([name, count, repr(sample), str(error)])
+                problems.append([name, count, repr(args[0]), str(error)])
             except Exception:
                 pass
             if count == 0:
