@@ -1,0 +1,260 @@
+// A second module of the family, built only for the test suite. It compiles the same runtime and the
+// same descriptor table as _Client3, joins the shared type ring at import, and offers functions that
+// look inside its copy of the runtime: the ring, descriptors and cast lists, pointer conversion in
+// both directions, the type cache, packed values, and the text conversions.
+#include <cstring>
+
+#include "convert/text.h"
+#include "runtime/runtime.h"
+#include "runtime/types.h"
+#include "runtime/wrap.h"
+
+namespace client3 {
+namespace {
+
+using ZarvoSDKClientCPP::SafeString;
+
+PyObject* Address(const void* pointer) { return PyLong_FromVoidPtr(const_cast<void*>(pointer)); }
+
+// The descriptor of a mangled name anywhere in the ring; None selects no descriptor at all.
+bool RingType(PyObject* name, TypeInfo** out) {
+  *out = nullptr;
+  if (name == Py_None) return true;
+  const char* text = PyUnicode_AsUTF8(name);
+  if (!text) return false;
+  ModuleInfo* head = GetModule();
+  *out = head ? TypeQueryMangled(head, head, text) : nullptr;
+  if (!*out) PyErr_Format(PyExc_LookupError, "no descriptor %s", text);
+  return *out != nullptr;
+}
+
+// Addresses of the records in the ring, from its head.
+PyObject* Ring(PyObject*, PyObject*) {
+  PyObject* list = PyList_New(0);
+  ModuleInfo* head = GetModule();
+  if (!list || !head) return list;
+  ModuleInfo* module = head;
+  do {
+    PyObject* item = Address(module);
+    if (!item || PyList_Append(list, item) < 0) {
+      Py_XDECREF(item);
+      Py_DECREF(list);
+      return nullptr;
+    }
+    Py_DECREF(item);
+    module = module->next;
+  } while (module != head);
+  return list;
+}
+
+PyObject* OwnModule(PyObject*, PyObject*) { return Address(&thisModule); }
+
+// The mangled names of a descriptor's accepted source types, in list order.
+PyObject* Casts(PyObject*, PyObject* name) {
+  TypeInfo* type;
+  if (!RingType(name, &type)) return nullptr;
+  PyObject* list = PyList_New(0);
+  for (CastInfo* cast = type ? type->casts : nullptr; list && cast; cast = cast->next) {
+    PyObject* item = PyUnicode_FromString(cast->type->mangledName);
+    if (!item || PyList_Append(list, item) < 0) Py_CLEAR(list);
+    Py_XDECREF(item);
+  }
+  return list;
+}
+
+// (descriptor found from the ring head's own table, the one this module uses, this module's static
+// one) for a mangled name.
+PyObject* Descriptor(PyObject*, PyObject* name) {
+  const char* text = PyUnicode_AsUTF8(name);
+  if (!text) return nullptr;
+  ModuleInfo* head = GetModule();
+  TypeInfo* fromHead = head ? TypeQueryMangled(head, head->next, text) : nullptr;
+  TypeInfo* used = TypeQueryMangled(&thisModule, thisModule.next, text);
+  TypeInfo* initial = nullptr;
+  for (std::size_t i = 0; i < thisModule.size; ++i)
+    if (std::strcmp(thisModule.typeInitial[i]->mangledName, text) == 0) initial = thisModule.typeInitial[i];
+  return Py_BuildValue("(NNN)", Address(fromHead), Address(used), Address(initial));
+}
+
+// The address of the descriptor that an object's proxy carries, or None.
+PyObject* ProxyType(PyObject*, PyObject* object) {
+  SwigPyObject* proxy = GetThisProxy(object);
+  if (!proxy) Py_RETURN_NONE;
+  return Address(proxy->type);
+}
+
+// make(mangled name or None, address, flags): NewPointerObj.
+PyObject* Make(PyObject*, PyObject* args) {
+  PyObject *name, *address;
+  int flags;
+  if (!PyArg_ParseTuple(args, "OOi", &name, &address, &flags)) return nullptr;
+  TypeInfo* type;
+  if (!RingType(name, &type)) return nullptr;
+  void* pointer = PyLong_AsVoidPtr(address);
+  if (PyErr_Occurred()) return nullptr;
+  return NewPointerObj(nullptr, pointer, type, flags);
+}
+
+// convert(object, mangled name or None, flags[, outputs]) -> (code, address or None, own):
+// ConvertPtr; with `outputs` false the conversion is asked for its code only.
+PyObject* Convert(PyObject*, PyObject* args) {
+  PyObject *object, *name;
+  int flags, outputs = 1;
+  if (!PyArg_ParseTuple(args, "OOi|p", &object, &name, &flags, &outputs)) return nullptr;
+  TypeInfo* type;
+  if (!RingType(name, &type)) return nullptr;
+  void* pointer = nullptr;
+  int own = 0;
+  int code = outputs ? ConvertPtr(object, &pointer, type, flags, &own) : ConvertPtr(object, nullptr, type, flags);
+  if (code < 0) return Py_BuildValue("(iOi)", code, Py_None, own);
+  PyObject* address = pointer ? Address(pointer) : (Py_INCREF(Py_None), Py_None);
+  return Py_BuildValue("(iNi)", code, address, own);
+}
+
+// The mangled name TypeQuery finds for a text, or None.
+PyObject* Query(PyObject*, PyObject* text) {
+  const char* chars = PyUnicode_AsUTF8(text);
+  if (!chars) return nullptr;
+  TypeInfo* type = TypeQuery(chars);
+  if (!type) Py_RETURN_NONE;
+  return PyUnicode_FromString(type->mangledName);
+}
+
+PyObject* Cache(PyObject*, PyObject*) {
+  PyObject* cache = TypeCache();
+  Py_XINCREF(cache);
+  return cache;
+}
+
+// packed(bytes, mangled name): a SwigPyPacked holding a copy of the bytes.
+PyObject* Packed(PyObject*, PyObject* args) {
+  Py_buffer data;
+  PyObject* name;
+  if (!PyArg_ParseTuple(args, "y*O", &data, &name)) return nullptr;
+  TypeInfo* type;
+  PyObject* result = RingType(name, &type) ? SwigPyPacked_New(data.buf, data.len, type) : nullptr;
+  PyBuffer_Release(&data);
+  return result;
+}
+
+// The mangled names of this module's static descriptor table, in table order.
+PyObject* Names(PyObject*, PyObject*) {
+  PyObject* list = PyList_New(static_cast<Py_ssize_t>(thisModule.size));
+  for (std::size_t i = 0; list && i < thisModule.size; ++i) {
+    PyObject* item = PyUnicode_FromString(thisModule.typeInitial[i]->mangledName);
+    if (!item) Py_CLEAR(list);
+    else PyList_SET_ITEM(list, static_cast<Py_ssize_t>(i), item);
+  }
+  return list;
+}
+
+// unpack(arguments or None, name, min, max) -> (count, items): UnpackTuple on the given argument
+// object (None passes no argument object at all); missing items come back as None.
+PyObject* Unpack(PyObject*, PyObject* args) {
+  PyObject* given;
+  const char* name;
+  Py_ssize_t min, max;
+  if (!PyArg_ParseTuple(args, "Osnn", &given, &name, &min, &max)) return nullptr;
+  if (max < 0 || max > 8) return PyErr_Format(PyExc_ValueError, "max out of range");
+  PyObject* items[8];
+  Py_ssize_t count = UnpackTuple(given == Py_None ? nullptr : given, name, min, max, items);
+  if (!count) return nullptr;
+  PyObject* list = PyTuple_New(max);
+  for (Py_ssize_t i = 0; list && i < max; ++i) {
+    PyObject* item = items[i] ? items[i] : Py_None;
+    Py_INCREF(item);
+    PyTuple_SET_ITEM(list, i, item);
+  }
+  return list ? Py_BuildValue("(nN)", count, list) : nullptr;
+}
+
+PyObject* ErrorTypeOf(PyObject*, PyObject* code) {
+  int value = PyLong_AsLong(code);
+  if (PyErr_Occurred()) return nullptr;
+  PyObject* type = ErrorType(value);
+  Py_INCREF(type);
+  return type;
+}
+
+// Makes the given exception (an instance, or a class raised without a value) pending; None leaves
+// nothing pending.
+void SetPending(PyObject* exception) {
+  if (exception == Py_None) return;
+  if (PyExceptionClass_Check(exception))
+    PyErr_SetNone(exception);
+  else
+    PyErr_SetObject(reinterpret_cast<PyObject*>(Py_TYPE(exception)), exception);
+}
+
+// add_error_msg(pending, message) and raise_or_modify(pending, message): always raise.
+PyObject* AddErrorMsgTo(PyObject*, PyObject* args) {
+  PyObject* pending;
+  const char* message;
+  if (!PyArg_ParseTuple(args, "Os", &pending, &message)) return nullptr;
+  SetPending(pending);
+  AddErrorMsg(message);
+  return nullptr;
+}
+
+PyObject* RaiseOrModify(PyObject*, PyObject* args) {
+  PyObject* pending;
+  const char* message;
+  if (!PyArg_ParseTuple(args, "Os", &pending, &message)) return nullptr;
+  SetPending(pending);
+  RaiseOrModifyTypeError(message);
+  return nullptr;
+}
+
+// What the library side receives from a `SafeString const &` argument: its bytes, or None when the
+// text is null or empty.
+constexpr auto Received = [](const SafeString& text) -> PyObject* {
+  const char* chars = text.Text();
+  if (!chars || !*chars) Py_RETURN_NONE;
+  return PyBytes_FromString(chars);
+};
+
+// A library-made string (owned through the factory) holding the given text, returned by value.
+constexpr auto LibraryText = [](const SafeString& text) {
+  return SafeString(ZarvoSDKClientCPP::VStringFactory::Instance(), text.Text() ? text.Text() : "");
+};
+
+using Functions = Table<
+    Raw<"ring", NoArgs, Ring>,
+    Raw<"own_module", NoArgs, OwnModule>,
+    Raw<"casts", Object, Casts>,
+    Raw<"descriptor", Object, Descriptor>,
+    Raw<"proxy_type", Object, ProxyType>,
+    Raw<"make", Tuple, Make>,
+    Raw<"convert", Tuple, Convert>,
+    Raw<"query", Object, Query>,
+    Raw<"cache", NoArgs, Cache>,
+    Raw<"packed", Tuple, Packed>,
+    Raw<"names", NoArgs, Names>,
+    Raw<"unpack", Tuple, Unpack>,
+    Raw<"error_type", Object, ErrorTypeOf>,
+    Raw<"add_error_msg", Tuple, AddErrorMsgTo>,
+    Raw<"raise_or_modify", Tuple, RaiseOrModify>,
+    Fn<"echo", Object, Received, String>,
+    Fn<"library_text", Object, LibraryText, String>>;
+
+PyMethodDef methods[Functions::defs.size() + 1];
+
+PyModuleDef moduleDef = {PyModuleDef_HEAD_INIT, "_Client3Peer", nullptr, -1, methods,
+                         nullptr,               nullptr,        nullptr, nullptr};
+
+}  // namespace
+}  // namespace client3
+
+// The same start-up steps as _Client3: runtime singletons, module, then the ring.
+PyMODINIT_FUNC PyInit__Client3Peer() {
+  using namespace client3;
+  ThisName();
+  TypeCache();
+  SwigPyPacked_type();
+  SwigPyObject_type();
+  std::copy(Functions::defs.begin(), Functions::defs.end(), methods);
+  PyObject* module = PyModule_Create2(&moduleDef, 1013);
+  if (!module) return nullptr;
+  InitializeModule(nullptr);
+  return module;
+}

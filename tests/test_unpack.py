@@ -1,0 +1,177 @@
+"""Argument unpacking, error codes and the texts a script sees when a call goes wrong."""
+import pytest
+
+import _Client3
+from peer import build
+
+OVERLOADS = (
+    "Wrong number or type of arguments for overloaded function 'new_SafeString'.\n"
+    "  Possible C/C++ prototypes are:\n"
+    "    ZarvoSDKClientCPP::SafeString::SafeString(char const *)\n"
+    "    ZarvoSDKClientCPP::SafeString::SafeString()\n"
+    "    ZarvoSDKClientCPP::SafeString::SafeString(std::string const &)\n"
+    "    ZarvoSDKClientCPP::SafeString::SafeString(ZarvoSDKClientCPP::SafeString const &)\n"
+)
+
+
+@pytest.fixture(scope="session")
+def peer(tmp_path_factory):
+    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
+
+
+class Tuple(tuple):
+    pass
+
+
+# (argument object or None for no object, min, max) -> (result, items) or the exception text
+@pytest.mark.parametrize(
+    "given, low, high, expected",
+    [
+        (None, 0, 0, (1, ())),
+        (None, 1, 1, "f expected 1 arguments, got none"),
+        (None, 1, 2, "f expected at least 1 arguments, got none"),
+        (None, 0, 2, "f expected at least 0 arguments, got none"),
+        ((), 0, 0, (1, ())),
+        ((), 1, 2, "f expected at least 1 arguments, got 0"),
+        ((1,), 2, 2, "f expected 2 arguments, got 1"),
+        ((1, 2), 3, 3, "f expected 3 arguments, got 2"),
+        ((1, 2, 3), 0, 2, "f expected at most 2 arguments, got 3"),
+        ((1, 2, 3), 2, 2, "f expected 2 arguments, got 3"),
+        ((1,), 0, 3, (2, (1, None, None))),
+        ((1, 2), 1, 2, (3, (1, 2))),
+        (Tuple((7, 8)), 2, 2, (3, (7, 8))),
+        # A bare object counts as one argument.
+        (5, 1, 1, (2, (5,))),
+        (5, 0, 3, (2, (5, None, None))),
+        ([1, 2], 1, 2, (2, ([1, 2], None))),
+    ],
+)
+def test_unpack(peer, given, low, high, expected):
+    if isinstance(expected, str):
+        with pytest.raises(TypeError) as raised:
+            peer.unpack(given, "f", low, high)
+        assert str(raised.value) == expected
+    else:
+        assert peer.unpack(given, "f", low, high) == expected
+
+
+@pytest.mark.parametrize("low, high", [(2, 2), (0, 0), (2, 3)])
+def test_unpack_bare_object_where_one_is_not_allowed(peer, low, high):
+    with pytest.raises(SystemError) as raised:
+        peer.unpack(5, "f", low, high)
+    assert str(raised.value) == "UnpackTuple() argument list is not a tuple"
+
+
+@pytest.mark.parametrize(
+    "code, exception",
+    [
+        (-1, RuntimeError), (-2, OSError), (-3, RuntimeError), (-4, IndexError), (-5, TypeError),
+        (-6, ZeroDivisionError), (-7, OverflowError), (-8, SyntaxError), (-9, ValueError),
+        (-10, SystemError), (-11, AttributeError), (-12, MemoryError), (-13, RuntimeError),
+        (-14, RuntimeError), (0, RuntimeError), (7, RuntimeError),
+    ],
+)
+def test_error_type(peer, code, exception):
+    assert peer.error_type(code) is exception
+
+
+class Unprintable(Exception):
+    def __str__(self):
+        raise ValueError("no text")
+
+
+# (pending exception, message) -> (raised type, text)
+@pytest.mark.parametrize(
+    "pending, result",
+    [
+        (None, (RuntimeError, "more")),
+        (ValueError("old"), (ValueError, "old more")),
+        (KeyError("k"), (KeyError, "'k' more")),
+        (IndexError, (IndexError, "more")),  # raised without a value
+    ],
+)
+def test_add_error_msg(peer, pending, result):
+    with pytest.raises(Exception) as raised:
+        peer.add_error_msg(pending, "more")
+    assert (type(raised.value), raised.value.args) == (result[0], (result[1],))
+
+
+@pytest.mark.xfail(strict=True, reason="an old value without text is shown as 'Invalid error message' instead of "
+                   "giving the message alone")
+def test_add_error_msg_when_the_old_value_has_no_text(peer):
+    with pytest.raises(Unprintable) as raised:
+        peer.add_error_msg(Unprintable(), "more")
+    assert raised.value.args == ("more",)
+
+
+class TypeErrorKind(TypeError):
+    pass
+
+
+@pytest.mark.parametrize(
+    "pending, result",
+    [
+        (None, (TypeError, "msg")),
+        (TypeError("inner"), (TypeError, "inner\nAdditional information:\nmsg")),
+        (TypeErrorKind("sub"), (TypeErrorKind, "sub\nAdditional information:\nmsg")),
+        (ValueError("other"), (TypeError, "msg")),
+    ],
+)
+def test_raise_or_modify_type_error(peer, pending, result):
+    with pytest.raises(Exception) as raised:
+        peer.raise_or_modify(pending, "msg")
+    assert (type(raised.value), str(raised.value)) == result
+
+
+# ---- Through the module's own functions ---------------------------------------------------------
+
+
+@pytest.mark.parametrize(
+    "args, exception, text",
+    [
+        ((1, 2), TypeError, "new_SafeString expected at most 1 arguments, got 2\nAdditional information:\n" + OVERLOADS),
+        ((1, 2, 3), TypeError, "new_SafeString expected at most 1 arguments, got 3\nAdditional information:\n" + OVERLOADS),
+        ((5,), TypeError, OVERLOADS),
+        ((b"bytes",), TypeError, OVERLOADS),
+        ((1.5,), TypeError, OVERLOADS),
+        (("a\udcff",), TypeError, OVERLOADS),  # not encodable: no overload takes it
+    ],
+)
+def test_new_safe_string_overload_errors(args, exception, text):
+    with pytest.raises(exception) as raised:
+        _Client3.new_SafeString(*args)
+    assert str(raised.value) == text
+    assert raised.value.__cause__ is None and raised.value.__context__ is None
+
+
+SELF = "in method '{}', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'"
+
+
+@pytest.mark.parametrize("name", ["SafeString_IsEmpty", "SafeString_Value", "SafeString___str__", "SafeString___repr__"])
+@pytest.mark.parametrize("bad", [5, "text", b"text", object(), [], lambda: _Client3.new_SafeString().__class__])
+def test_wrong_self_argument(name, bad):
+    bad = bad() if callable(bad) else bad
+    with pytest.raises(TypeError) as raised:
+        getattr(_Client3, name)(bad)
+    assert str(raised.value) == SELF.format(name)
+
+
+@pytest.mark.parametrize("name", ["SafeString_IsEmpty", "SafeString_Value", "SafeString___str__", "SafeString___repr__"])
+def test_self_argument_of_another_type_and_none(peer, name):
+    other = peer.make("_p_ZarvoSDKClientCPP__Type_Parameter", 0x10, 2)
+    with pytest.raises(TypeError) as raised:
+        getattr(_Client3, name)(other)
+    assert str(raised.value) == SELF.format(name)
+    # None converts to a null pointer, which is refused rather than used.
+    with pytest.raises(ValueError) as raised:
+        getattr(_Client3, name)(None)
+    assert str(raised.value) == "invalid null reference " + SELF.format(name)
+
+
+@pytest.mark.parametrize("name", ["SafeString_IsEmpty", "delete_SafeString", "ToString", "SafeString_swigregister"])
+def test_one_object_functions_take_exactly_one(name):
+    function = getattr(_Client3, name)
+    with pytest.raises(TypeError):
+        function()
+    with pytest.raises(TypeError):
+        function(1, 2)
