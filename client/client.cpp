@@ -4,14 +4,6 @@
 
 namespace client3 {
 
-namespace {
-
-using Functions = Table<
-    Register<"ZarvoPelluxPostClient", p_ZarvoPelluxPostClient>,
-    Init<"ZarvoPelluxPostClient">>;
-
-}  // namespace
-
-std::span<const PyMethodDef> ClientFunctions() { return Functions::defs; }
+std::span<const PyMethodDef> ClientFunctions() { return {}; }
 
 }  // namespace client3

@@ -21,37 +21,41 @@ constexpr const char* kNewSafeStringOverloads =
     "    ZarvoSDKClientCPP::SafeString::SafeString(std::string const &)\n"
     "    ZarvoSDKClientCPP::SafeString::SafeString(ZarvoSDKClientCPP::SafeString const &)\n";
 
-// A heap copy of the UTF-8 of a str, or of the text of a character-pointer proxy (`made` tells
-// which). Returns null when the object is neither; any error it met is cleared.
-char* TextOf(PyObject* o, bool& made) {
-  made = false;
+// The `char const *` conversion: a str gives a heap copy of its UTF-8 (`made` is set), a
+// character-pointer proxy its own text, and None a null text. A null `out` only tests.
+int AsCharPtr(PyObject* o, char** out, bool* made) {
   if (PyUnicode_Check(o)) {
     PyObject* bytes = PyUnicode_AsUTF8String(o);
     if (!bytes) {
       PyErr_Clear();
-      return nullptr;
+      return ErrTypeError;
     }
-    Py_ssize_t size = PyBytes_GET_SIZE(bytes);
-    char* copy = new char[size + 1];
-    std::memcpy(copy, PyBytes_AS_STRING(bytes), size + 1);
+    if (out) {
+      Py_ssize_t size = PyBytes_GET_SIZE(bytes);
+      *out = new char[size + 1];
+      std::memcpy(*out, PyBytes_AS_STRING(bytes), size + 1);
+      *made = true;
+    }
     Py_DECREF(bytes);
-    made = true;
-    return copy;
+    return ResultOk;
   }
+  TypeInfo* charType = TypeQuery("_p_char");
   void* pointer = nullptr;
-  if (TypeInfo* charType = TypeQuery("_p_char"); charType && ConvertPtr(o, &pointer, charType, 0) >= 0 && pointer)
-    return static_cast<char*>(pointer);
-  return nullptr;
+  if (!charType || ConvertPtr(o, &pointer, charType, 0) < 0) return ErrTypeError;
+  if (out) *out = static_cast<char*>(pointer);
+  return ResultOk;
 }
 
-// The `std::string const &` conversion: a str or a character-pointer proxy gives a new string; a
+// The `std::string const &` conversion: text as above gives a new string (None a null one); a
 // proxy of a registered "std::string *" type gives that very string.
 int AsStdString(PyObject* o, std::string** out) {
-  bool made;
-  if (char* text = TextOf(o, made)) {
-    if (out) *out = new std::string(text);
+  char* text = nullptr;
+  bool made = false;
+  if (AsCharPtr(o, out ? &text : nullptr, &made) >= 0) {
+    if (!out) return ResultOk;
+    *out = text ? new std::string(text) : nullptr;
     if (made) delete[] text;
-    return NewObjectMask;
+    return *out ? NewObjectMask : ResultOk;
   }
   TypeInfo* stringType = TypeQuery("std::string *");
   if (!stringType) return ResultError;
@@ -103,12 +107,8 @@ PyObject* NewSafeString(PyObject*, PyObject* args) {
       if (code & NewObjectMask) delete text;
       return result;
     }
-    bool made;
-    if (char* text = TextOf(argv[0], made)) {
-      PyObject* result = NewView(text);
-      if (made) delete[] text;
-      return result;
-    }
+    // The `char const *` form takes nothing that the `std::string` form refuses, so it is never
+    // the one chosen.
   }
   RaiseOrModifyTypeError(kNewSafeStringOverloads);
   return nullptr;

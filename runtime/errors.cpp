@@ -59,13 +59,16 @@ void AddErrorMsg(const char* message) {
   }
   PyObject *type, *value, *trace;
   PyErr_Fetch(&type, &value, &trace);
-  if (value) {
-    PyObject* old = PyObject_Str(value);
-    const char* oldText = old ? PyUnicode_AsUTF8(old) : nullptr;
+  // An old value without text leaves the message alone; a text that cannot be read as UTF-8 is
+  // named as such.
+  PyObject* old = value ? PyObject_Str(value) : nullptr;
+  if (old) {
+    const char* oldText = PyUnicode_AsUTF8(old);
     PyErr_Clear();
     PyErr_Format(type, "%s %s", oldText ? oldText : "Invalid error message", message);
-    Py_XDECREF(old);
+    Py_DECREF(old);
   } else {
+    PyErr_Clear();
     PyErr_Format(type, "%s", message);
   }
   Py_XDECREF(type);

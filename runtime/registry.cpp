@@ -225,14 +225,21 @@ const char* PrettyTypeName(const TypeInfo* type) {
 }
 
 SwigPyObject* GetThisProxy(PyObject* object) {
-  while (object) {
+  // A chain of "this" attributes that does not end in a proxy within this many steps is taken to
+  // loop back on itself (an object whose "this" is itself, say) and holds no proxy.
+  constexpr int kLongestChain = 64;
+  for (int depth = 0; object && depth < kLongestChain; ++depth) {
     if (SwigPyObject_Check(object)) return reinterpret_cast<SwigPyObject*>(object);
     PyObject* next = PyObject_GetAttr(object, ThisName());
     if (!next) {
       PyErr_Clear();
       return nullptr;
     }
-    Py_DECREF(next);  // the owner keeps it alive
+    // The owner keeps its "this" alive. One that nobody else holds (made afresh by a property, say)
+    // would be gone once released, so it does not count as a proxy the object carries.
+    bool kept = Py_REFCNT(next) > 1;
+    Py_DECREF(next);
+    if (!kept) return nullptr;
     object = next;
   }
   return nullptr;
@@ -252,7 +259,7 @@ int ConvertPtr(PyObject* object, void** out, TypeInfo* target, int flags, int* o
     if (!target || proxy->type == target) {
       if (out) *out = pointer;
       accepted = true;
-    } else if (CastInfo* cast = TypeCheck(proxy->type->mangledName, target)) {
+    } else if (CastInfo* cast = proxy->type ? TypeCheck(proxy->type->mangledName, target) : nullptr) {
       int newMemory = 0;
       if (out) *out = cast->converter ? cast->converter(pointer, &newMemory) : pointer;
       if (newMemory == CastNewMemory) {
@@ -283,10 +290,11 @@ int ConvertPtr(PyObject* object, void** out, TypeInfo* target, int flags, int* o
       } else if (made) {
         if (SwigPyObject* madeProxy = GetThisProxy(made)) {
           void* pointer = nullptr;
-          if (ConvertPtr(reinterpret_cast<PyObject*>(madeProxy), &pointer, target, 0) >= 0 && out) {
+          result = ConvertPtr(reinterpret_cast<PyObject*>(madeProxy), &pointer, target, 0);
+          if (result >= 0 && out) {
             *out = pointer;
-            madeProxy->own = 0;
-            result = ResultOk | NewObjectMask;
+            madeProxy->own = 0;  // the caller owns the new object now
+            result |= NewObjectMask;
           }
         }
       }
@@ -345,11 +353,15 @@ PyObject* NewPointerObj(PyObject* self, void* ptr, TypeInfo* type, int flags) {
     if (instance && PyObject_SetAttr(instance, ThisName(), bare) < 0) Py_CLEAR(instance);
   } else {
     auto* cls = reinterpret_cast<PyTypeObject*>(data->newArgs);
-    PyObject* emptyArgs = PyTuple_New(0);
-    PyObject* emptyKw = PyDict_New();
-    if (emptyArgs && emptyKw) instance = cls->tp_new(cls, emptyArgs, emptyKw);
-    Py_XDECREF(emptyArgs);
-    Py_XDECREF(emptyKw);
+    if (!cls->tp_new) {
+      PyErr_Format(PyExc_TypeError, "cannot create '%s' instances", cls->tp_name);
+    } else {
+      PyObject* emptyArgs = PyTuple_New(0);
+      PyObject* emptyKw = PyDict_New();
+      if (emptyArgs && emptyKw) instance = cls->tp_new(cls, emptyArgs, emptyKw);
+      Py_XDECREF(emptyArgs);
+      Py_XDECREF(emptyKw);
+    }
     if (instance) {
       if (PyObject_SetAttr(instance, ThisName(), bare) < 0)
         Py_CLEAR(instance);

@@ -165,8 +165,6 @@ def test_new_safe_string_from_a_character_pointer_proxy(peer):
     assert isinstance(_Client3.SafeString_Value(made), str)
 
 
-@pytest.mark.xfail(strict=True, reason="None passes the character-pointer test as a null text, so the string "
-                   "form is chosen and must refuse the null reference; the overload error is raised instead")
 def test_new_safe_string_from_none_is_a_null_reference():
     with pytest.raises(ValueError) as raised:
         _Client3.new_SafeString(None)

@@ -96,8 +96,6 @@ def test_add_error_msg(peer, pending, result):
     assert (type(raised.value), raised.value.args) == (result[0], (result[1],))
 
 
-@pytest.mark.xfail(strict=True, reason="an old value without text is shown as 'Invalid error message' instead of "
-                   "giving the message alone")
 def test_add_error_msg_when_the_old_value_has_no_text(peer):
     with pytest.raises(Unprintable) as raised:
         peer.add_error_msg(Unprintable(), "more")
