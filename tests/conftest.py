@@ -7,12 +7,20 @@ import pytest
 sys.path.insert(0, os.path.dirname(__file__))
 
 import companion  # noqa: E402
+from peer import build  # noqa: E402
 
 
 @pytest.fixture(scope="session", autouse=True)
 def registered_classes():
     """Every wrapped class registered, as a script that uses the module would have it."""
     return companion.register()
+
+
+@pytest.fixture(scope="session")
+def peer(tmp_path_factory):
+    """A second module of the family, built for the tests, that looks inside the runtime and makes
+    objects the way the library does."""
+    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
 
 
 def run_python(code):

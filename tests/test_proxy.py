@@ -15,11 +15,6 @@ OWN = 1
 LEAK = "swig/python detected a memory leak of type '{}', no destructor found.\n"
 
 
-@pytest.fixture(scope="session")
-def peer(tmp_path_factory):
-    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
-
-
 @pytest.fixture
 def safe_string_class():
     """Lets a test register its own class for SafeString; the companion class is put back after."""

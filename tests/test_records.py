@@ -1,6 +1,4 @@
 """The record families: function table, calling conventions, argument checks and field access."""
-import shutil
-import subprocess
 import textwrap
 from pathlib import Path
 
@@ -314,56 +312,88 @@ EMPTY_COMMAND = ("Cmd\nDoes it\n----------------\nInput Parameters\n------------
 
 
 def test_default_output_string_refuses_a_null_record():
-    # No script can make an Output_GetCommandInfo itself, so only a null one is at hand here; the
-    # layout with parameters is checked natively below.
     raises(ValueError, "invalid null reference in method 'Output_GetCommandInfo_DefaultOutputString', "
            f"argument 1 of type '{NS}Output_GetCommandInfo *'", m.Output_GetCommandInfo_DefaultOutputString, None)
 
 
-DRIVER = r"""
-#include <cstdio>
-#include <string>
-#include "ZarvoSDKClientCPP/Outputs.h"
-using namespace ZarvoSDKClientCPP;
-static Type_Parameter P(const char* n, const char* v) {
-  Type_Parameter p; p.Name = SafeString(VStringFactory::Instance(), n);
-  if (v) p.Value = SafeString(VStringFactory::Instance(), v);
-  return p;
-}
-static void Show(Output_GetCommandInfo& c) { std::string s = c.DefaultOutputString(); std::fwrite(s.data(), 1, s.size(), stdout); std::fputs("@\n", stdout); }
-int main() {
-  Output_GetCommandInfo c;
-  c.Name = SafeString("Cmd"); c.Description = SafeString("Does it");
-  Show(c);
-  c.InputParameters = {P("Frame", "12"), P("Subject", nullptr)};
-  Show(c);
-  c.OutputParameters = {P("LongerName", "x")};
-  Show(c);
-  c.InputParameters.clear();
-  c.Name = SafeString(); c.Description = SafeString();
-  Show(c);
-}
-"""
+def command(peer, name, description, inputs=(), outputs=()):
+    """A command description as the library hands it out."""
+    record = peer.record("_p_ZarvoSDKClientCPP__Output_GetCommandInfo")
+    if name is not None:
+        m.Output_GetCommandInfo_Name_set(record, peer.library_text(name))
+        m.Output_GetCommandInfo_Description_set(record, peer.library_text(description))
+    for field, parameters in (("InputParameters", inputs), ("OutputParameters", outputs)):
+        vector = getattr(m, "Output_GetCommandInfo_%s_get" % field)(record)
+        for parameter in parameters:
+            peer.push_parameter(vector, *parameter)
+    return record
 
 
-def test_default_output_string_layout(tmp_path):
-    compiler = shutil.which("c++") or shutil.which("g++")
-    if not compiler:
-        pytest.skip("no C++ compiler")
-    root = Path(__file__).resolve().parent.parent
-    (tmp_path / "driver.cpp").write_text(DRIVER)
-    program = tmp_path / "driver"
-    subprocess.run([compiler, "-std=c++20", "-I", str(root / "include"), str(tmp_path / "driver.cpp"),
-                    str(root / "records" / "command_info.cpp"), str(root / "library" / "StringFactory.cpp"),
-                    "-o", str(program)], check=True)
-    shown = subprocess.run([str(program)], capture_output=True, text=True, check=True).stdout.split("@\n")
-    dashes16, dashes17 = "-" * 16, "-" * 17
-    assert shown[0] == EMPTY_COMMAND
-    assert shown[1] == "\n".join(["Cmd", "Does it", dashes16, "Input Parameters", dashes16, "Frame     12",
-                                  "Subject   ", dashes17, "Output Parameters", dashes17, "None", ""])
+DASHES16, DASHES17 = "-" * 16, "-" * 17
+
+
+@pytest.mark.parametrize("name, description, inputs, outputs, lines", [
+    ("Cmd", "Does it", [], [], ["Cmd", "Does it", DASHES16, "Input Parameters", DASHES16, "None", DASHES17,
+                                "Output Parameters", DASHES17, "None"]),
+    ("Cmd", "Does it", [("Frame", "12"), ("Subject", "")], [],
+     ["Cmd", "Does it", DASHES16, "Input Parameters", DASHES16, "Frame     12", "Subject   ", DASHES17,
+      "Output Parameters", DASHES17, "None"]),
     # One column for both lists: the longest name of either, plus three.
-    assert shown[2] == "\n".join(["Cmd", "Does it", dashes16, "Input Parameters", dashes16, "Frame        12",
-                                  "Subject      ", dashes17, "Output Parameters", dashes17, "LongerName   x", ""])
-    assert shown[3] == "\n".join(["", "", dashes16, "Input Parameters", dashes16, "None", dashes17,
-                                  "Output Parameters", dashes17, "LongerName   x", ""])
-    assert shown[4] == ""
+    ("Cmd", "Does it", [("Frame", "12"), ("Subject", "")], [("LongerName", "x")],
+     ["Cmd", "Does it", DASHES16, "Input Parameters", DASHES16, "Frame        12", "Subject      ", DASHES17,
+      "Output Parameters", DASHES17, "LongerName   x"]),
+    # Null texts count as empty.
+    (None, None, [], [("LongerName", "x")], ["", "", DASHES16, "Input Parameters", DASHES16, "None", DASHES17,
+                                             "Output Parameters", DASHES17, "LongerName   x"]),
+])
+def test_default_output_string_layout(peer, name, description, inputs, outputs, lines):
+    record = command(peer, name, description, inputs, outputs)
+    assert m.Output_GetCommandInfo_DefaultOutputString(record) == "\n".join(lines) + "\n"
+
+
+# ---- Records as the library hands them out -----------------------------------------------------
+
+def library_record(peer, name):
+    return peer.record("_p_ZarvoSDKClientCPP__" + name)
+
+
+@pytest.mark.parametrize("value", [0, 2**31 - 1, 2**31, 2**63, 2**64 - 1])
+def test_unsigned_long_long_fields_come_back_exactly(peer, value):
+    record = library_record(peer, "Output_GetObject")
+    m.Output_GetObject_ID_set(record, value)
+    got = m.Output_GetObject_ID_get(record)
+    assert type(got) is int and got == value
+
+
+@pytest.mark.parametrize("result, error", [(0, False), (1003, True), (1, True)])
+def test_error_of_any_record(peer, result, error):
+    record = library_record(peer, "Output_GetTrajectoryAtFrame")
+    m.Output_Result_Result_set(record, result)
+    assert m.Output_Result_Error(record) is error
+    assert m.Output_Result_Result_get(record) == result
+
+
+def test_parameter_vectors_move_between_records_as_copies(peer):
+    info = command(peer, "Cmd", "Does it", outputs=[("Frame", "12")])
+    request = library_record(peer, "Output_ProcessRequest")
+    source = m.Output_GetCommandInfo_OutputParameters_get(info)
+    m.Output_ProcessRequest_OutputParameters_set(request, source)
+    copied = m.Output_ProcessRequest_OutputParameters_get(request)
+    assert not copied.own() and copied != source
+    # The copy is independent: growing the source leaves it as it was.
+    peer.push_parameter(source, "Subject", "x")
+    m.Output_GetCommandInfo_InputParameters_set(info, copied)
+    assert m.Output_GetCommandInfo_DefaultOutputString(info).count("Frame") == 2
+    assert "Subject   x" in m.Output_GetCommandInfo_DefaultOutputString(info)
+    # A field assigned to itself is left as it is.
+    m.Output_GetCommandInfo_InputParameters_set(info, m.Output_GetCommandInfo_InputParameters_get(info))
+    assert m.Output_GetCommandInfo_DefaultOutputString(info).count("Frame") == 2
+
+
+def test_text_fields_of_library_records_are_duplicated_on_assignment(peer):
+    record = library_record(peer, "Output_GetTakeInfo")
+    source = peer.library_text("take 1")
+    m.Output_GetTakeInfo_Notes_set(record, source)
+    del source  # the field keeps its own copy
+    assert m.SafeString_Value(m.Output_GetTakeInfo_Notes_get(record)) == "take 1"
+    assert m.SafeString_IsEmpty(m.Output_GetTakeInfo_Name_get(record))

@@ -28,11 +28,6 @@ def record(name):
     return "_p_ZarvoSDKClientCPP__Output_" + name
 
 
-@pytest.fixture(scope="session")
-def peer(tmp_path_factory):
-    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
-
-
 @pytest.fixture
 def safe_string_class():
     """Lets a test register its own class for SafeString; the companion class is put back after."""

@@ -16,11 +16,6 @@ OUTPUT_RESULT = "_p_ZarvoSDKClientCPP__Output_Result"
 BASES = [OUTPUT_RESULT, "_p_ZarvoSDKClientCPP__ZarvoClient", "_p_ZarvoSDKClientCPP__IStringFactory"]
 
 
-@pytest.fixture(scope="session")
-def peer(tmp_path_factory):
-    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
-
-
 def capsule_pointer():
     get = ctypes.pythonapi.PyCapsule_GetPointer
     get.restype = ctypes.c_void_p

@@ -10,11 +10,6 @@ SAFE_STRING = "_p_ZarvoSDKClientCPP__SafeString"
 TEXT_FUNCTIONS = ["SafeString_Value", "SafeString___str__", "SafeString___repr__"]
 
 
-@pytest.fixture(scope="session")
-def peer(tmp_path_factory):
-    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
-
-
 def test_default_safe_string():
     proxy = _Client3.new_SafeString()
     assert type(proxy).__name__ == "SwigPyObject"

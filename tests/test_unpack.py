@@ -14,11 +14,6 @@ OVERLOADS = (
 )
 
 
-@pytest.fixture(scope="session")
-def peer(tmp_path_factory):
-    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
-
-
 class Tuple(tuple):
     pass
 

@@ -218,6 +218,32 @@ constexpr auto LibraryText = [](const SafeString& text) {
   return SafeString(ZarvoSDKClientCPP::VStringFactory::Instance(), text.Text() ? text.Text() : "");
 };
 
+// A zero-filled record of the type with the given mangled name, owned by its proxy, as the library
+// would hand one out (most records can only come from the library).
+PyObject* Record(PyObject*, PyObject* name) {
+  TypeInfo* type;
+  if (!RingType(name, &type)) return nullptr;
+  using namespace ZarvoSDKClientCPP;
+#define CLIENT3_MAKE_RECORD(record) \
+  if (type == Type(p_##record)) return NewPointerObj(nullptr, new record(), type, PointerOwn);
+  CLIENT3_DERIVED_RECORDS(CLIENT3_MAKE_RECORD)
+  CLIENT3_MAKE_RECORD(Output_Result)
+#undef CLIENT3_MAKE_RECORD
+  PyErr_SetString(PyExc_LookupError, "not a record");
+  return nullptr;
+}
+
+// Appends a parameter with library-owned texts to a parameter vector.
+constexpr auto PushParameter = [](std::vector<ZarvoSDKClientCPP::Type_Parameter>* parameters,
+                                  const SafeString& name, const SafeString& value) {
+  auto& factory = ZarvoSDKClientCPP::VStringFactory::Instance();
+  parameters->push_back({SafeString(factory, name.Text() ? name.Text() : ""),
+                         SafeString(factory, value.Text() ? value.Text() : "")});
+};
+using ParameterVector =
+    Pointer<std::vector<ZarvoSDKClientCPP::Type_Parameter>,
+            "std::vector< ZarvoSDKClientCPP::Type_Parameter,std::allocator< ZarvoSDKClientCPP::Type_Parameter > > &">;
+
 using Functions = Table<
     Raw<"ring", NoArgs, Ring>,
     Raw<"own_module", NoArgs, OwnModule>,
@@ -235,7 +261,9 @@ using Functions = Table<
     Raw<"add_error_msg", Tuple, AddErrorMsgTo>,
     Raw<"raise_or_modify", Tuple, RaiseOrModify>,
     Fn<"echo", Object, Received, String>,
-    Fn<"library_text", Object, LibraryText, String>>;
+    Fn<"library_text", Object, LibraryText, String>,
+    Raw<"record", Object, Record>,
+    Fn<"push_parameter", Tuple, PushParameter, ParameterVector, String, String>>;
 
 PyMethodDef methods[Functions::defs.size() + 1];
 
