@@ -327,11 +327,23 @@ try:
 except TypeError as error:
     print(error)
 """,
+    # A "this" made afresh on every access is gone once looked at: it holds no proxy.
+    "this made afresh": """
+class Fresh:
+    @property
+    def this(self):
+        return peer.make("_p_ZarvoSDKClientCPP__SafeString", 16, 0)
+try:
+    _Client3.SafeString_IsEmpty(Fresh())
+except TypeError as error:
+    print(error)
+""",
 }
 CRASH_OUTPUT = {
     "null descriptor": "in method 'SafeString_IsEmpty', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'\n",
     "class without creation slot": "refused\n",
     "this loops back": "in method 'SafeString_IsEmpty', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'\n",
+    "this made afresh": "in method 'SafeString_IsEmpty', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'\n",
 }
 
 
@@ -341,6 +353,7 @@ CRASH_OUTPUT = {
         "null descriptor",
         "class without creation slot",
         "this loops back",
+        "this made afresh",
     ],
 )
 def test_bad_input_from_outside_does_not_crash(peer, case):
