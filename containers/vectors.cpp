@@ -101,7 +101,8 @@ struct SliceArg {
 };
 
 // An iterator argument: any open or closed iterator over this instance's forward positions. The
-// iterator is not moved; its position is what the operation uses.
+// iterator is not moved; its position is what the operation uses. Overload dispatch only asks for
+// an iterator, so that one of the wrong kind is reported against its own argument.
 template <class V, Text Type>
 struct PositionArg {
   static constexpr auto type = Type;
@@ -114,6 +115,10 @@ struct PositionArg {
     if (!at) return ErrTypeError;
     value = at->get_current();
     return ResultOk;
+  }
+  static bool check(PyObject* o) {
+    void* pointer = nullptr;
+    return ConvertPtr(o, &pointer, TypeFor<swig::SwigPyIterator>(), 0) >= 0 && pointer;
   }
   typename V::iterator get() const { return value; }
 };
