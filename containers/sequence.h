@@ -26,7 +26,7 @@ inline int AsSafeString(PyObject* o, SafeString* out) {
   const char* text;
   if (PyUnicode_Check(o)) {
     if (!out) return ResultOk;
-    text = PyUnicode_AsUTF8(o);
+    text = PyUnicode_AsUTF8AndSize(o, nullptr);  // the text ends at an embedded NUL
     if (!text) return Raised;
   } else if (PyBytes_Check(o)) {
     if (!out) return ResultOk;

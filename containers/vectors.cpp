@@ -2,6 +2,7 @@
 #include <cstddef>
 #include <iterator>
 #include <memory>
+#include <new>
 #include <stdexcept>
 #include <type_traits>
 #include <vector>
@@ -191,6 +192,13 @@ struct Vector {
       throw std::out_of_range("index out of range");
     return at;
   }
+  // The library runs in a 32-bit process: a vector that could not fit in its address space is
+  // refused as exhausted memory rather than attempted.
+  static unsigned int Room(unsigned int n, std::size_t more = 0) {
+    std::size_t total = n + more;
+    if ((packed ? total / 8 : total * sizeof(T)) > 0x7fffffffu) throw std::bad_alloc();
+    return n;
+  }
   static void Triple(PyObject* slice, const V& v, Index& start, Index& stop, Index& step) {
     if (!SliceTriple(slice, static_cast<Index>(v.size()), start, stop, step)) throw Pending();
   }
@@ -252,9 +260,9 @@ struct Vector {
   };
   static constexpr auto make = [] { return Owned<V, PointerOwn | PointerNoShadow>{new V()}; };
   static constexpr auto copy = [](const V& s) { return Owned<V, PointerOwn | PointerNoShadow>{new V(s)}; };
-  static constexpr auto sized = [](unsigned int n) { return Owned<V, PointerOwn | PointerNoShadow>{new V(n)}; };
+  static constexpr auto sized = [](unsigned int n) { return Owned<V, PointerOwn | PointerNoShadow>{new V(Room(n))}; };
   static constexpr auto filled = [](unsigned int n, const T& x) {
-    return Owned<V, PointerOwn | PointerNoShadow>{new V(n, x)};
+    return Owned<V, PointerOwn | PointerNoShadow>{new V(Room(n), x)};
   };
   // front and back of an empty vector raise IndexError rather than read outside it.
   static constexpr auto front = [](Held<const V> s) {
@@ -265,14 +273,14 @@ struct Vector {
     if (s.v->empty()) throw std::out_of_range("index out of range");
     return Element(s, s.v->back());
   };
-  static constexpr auto assign = [](V* v, unsigned int n, const T& x) { v->assign(n, x); };
-  static constexpr auto resize = [](V* v, unsigned int n) { v->resize(n); };
-  static constexpr auto resizeFilled = [](V* v, unsigned int n, const T& x) { v->resize(n, x); };
+  static constexpr auto assign = [](V* v, unsigned int n, const T& x) { v->assign(Room(n), x); };
+  static constexpr auto resize = [](V* v, unsigned int n) { v->resize(Room(n)); };
+  static constexpr auto resizeFilled = [](V* v, unsigned int n, const T& x) { v->resize(Room(n), x); };
   static constexpr auto insert = [](V* v, It at, const T& x) { return OpenAt(v, v->insert(Inside(*v, at, true), x)); };
   static constexpr auto insertMany = [](V* v, It at, unsigned int n, const T& x) {
-    v->insert(Inside(*v, at, true), n, x);
+    v->insert(Inside(*v, at, true), Room(n, v->size()), x);
   };
-  static constexpr auto reserve = [](V* v, unsigned int n) { v->reserve(n); };
+  static constexpr auto reserve = [](V* v, unsigned int n) { v->reserve(Room(n)); };
   static constexpr auto capacity = [](const V* v) { return Count{v->capacity()}; };
 
   template <auto Target>
