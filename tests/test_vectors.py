@@ -11,14 +11,11 @@ from conftest import run_python
 
 class Instance:
     def __init__(self, prefix, element, samples, wrong):
-        self.prefix = prefix
+        self.prefix, self.samples, self.wrong = prefix, samples, wrong  # five distinct elements; one refused
         self.container = f"std::vector< {element} >"
         self.source = f"std::vector< {element},std::allocator< {element} > >"
-        self.packed = element == "bool"
-        self.text = prefix == "vectorss"
+        self.packed, self.text = element == "bool", prefix == "vectorss"
         self.value_type = self.container + ("::value_type" if self.packed else "::value_type const &")
-        self.samples = samples  # five distinct elements
-        self.wrong = wrong  # an element the instance refuses
 
     def __repr__(self):
         return self.prefix
@@ -49,105 +46,86 @@ INSTANCES = [
 ]
 by_instance = pytest.mark.parametrize("inst", INSTANCES, ids=repr)
 
-ORDER = (
-    "iterator __nonzero__ __bool__ __len__ __getslice__ __setslice__ __delslice__ __delitem__ __getitem__ "
-    "__setitem__ pop append empty size swap begin end rbegin rend clear get_allocator pop_back erase new push_back "
-    "front back assign resize insert reserve capacity swigregister swiginit"
-).split()
-SELF_ONLY = set(
-    "iterator __nonzero__ __bool__ __len__ pop empty size begin end rbegin rend clear get_allocator pop_back "
-    "front back capacity swigregister".split()
-)
-
-OVERLOADED = set("__setslice__ __delitem__ __getitem__ __setitem__ erase resize insert".split())
+ORDER = ("iterator __nonzero__ __bool__ __len__ __getslice__ __setslice__ __delslice__ __delitem__ __getitem__ "
+         "__setitem__ pop append empty size swap begin end rbegin rend clear get_allocator pop_back erase new "
+         "push_back front back assign resize insert reserve capacity swigregister swiginit").split()
+SELF_ONLY = set("iterator __nonzero__ __bool__ __len__ pop empty size begin end rbegin rend clear get_allocator "
+                "pop_back front back capacity swigregister".split())
+OVERLOADED = set("__setslice__ __delitem__ __getitem__ __setitem__ erase resize insert new".split())
 
 
 def function_name(prefix, member):
     return f"new_{prefix}" if member == "new" else f"{prefix}_{member}"
 
 
+def overload_text(name, *prototypes):
+    lines = "".join(f"    {p}\n" for p in prototypes)
+    return f"Wrong number or type of arguments for overloaded function '{name}'.\n  Possible C/C++ prototypes are:\n{lines}"
+
+
 def test_table_order():
-    names = [n for n in vars(m) if n.startswith(("vector", "new_vector", "SwigPyIterator", "delete_SwigPyIterator"))]
+    names = [n for n in vars(m) if "vector" in n or "SwigPyIterator" in n]
     iterator = [n for n in names if "SwigPyIterator" in n]
-    assert iterator[0] == "delete_SwigPyIterator" and iterator[-1] == "SwigPyIterator_swigregister"
-    assert len(iterator) == 18
-    expected = [function_name(i.prefix, f) for i in INSTANCES for f in ORDER]
-    assert [n for n in names if "SwigPyIterator" not in n] == expected
-    assert names.index("SwigPyIterator_swigregister") < names.index("vectorb_iterator")
+    assert len(iterator) == 18 and iterator[0] == "delete_SwigPyIterator" and iterator[-1] == "SwigPyIterator_swigregister"
+    assert names[18:] == [function_name(i.prefix, f) for i in INSTANCES for f in ORDER]
 
 
 @by_instance
-@pytest.mark.parametrize("member", ORDER)
-def test_calling_convention(inst, member):
-    """One-object functions refuse a call without arguments in the interpreter's words; tuple ones in ours."""
-    function = getattr(m, function_name(inst.prefix, member))
-    if member == "new":
-        return  # takes zero arguments legitimately
-    with pytest.raises(TypeError) as info:
-        function()
-    text = str(info.value)
-    if member in SELF_ONLY:
-        assert "takes exactly one argument (0 given)" in text
-    elif member in OVERLOADED:
-        assert text.startswith("Wrong number or type of arguments for overloaded function")
-    else:
-        name = "swiginit" if member == "swiginit" else function_name(inst.prefix, member)
-        assert text.startswith(name + " expected 2 arguments, got 0") or text.startswith(name + " expected 3 arguments")
+def test_calling_conventions(inst):
+    """One-object functions refuse an empty call in the interpreter's words, tuple functions in ours."""
+    for member in ORDER:
+        with pytest.raises(TypeError) as info:
+            getattr(m, function_name(inst.prefix, member))(*([] if member != "new" else [1, 2, 3]))
+        text = str(info.value)
+        if member in SELF_ONLY:
+            assert "takes exactly one argument (0 given)" in text, member
+        elif member in OVERLOADED:
+            assert "Wrong number or type of arguments for overloaded function" in text, member
+        else:
+            assert " expected 2 arguments, got 0" in text or " expected 3 arguments, got 0" in text, member
 
 
 @by_instance
-def test_empty_and_sizes(inst):
+def test_sizes_and_pop(inst):
     v = inst.new()
-    assert (inst.fn("__len__")(v), inst.fn("size")(v), inst.fn("__bool__")(v), inst.fn("__nonzero__")(v)) == (
-        0, 0, False, False)
-    assert inst.fn("empty")(v) is True
+    assert [inst.fn(f)(v) for f in ("__len__", "size", "__bool__", "__nonzero__", "empty")] == [0, 0, False, False, True]
     with pytest.raises(IndexError, match="^pop from empty container$"):
         inst.fn("pop")(v)
-    assert inst.fn("size")(v) == 0
     w = inst.make()
-    assert (inst.fn("__len__")(w), inst.fn("__bool__")(w), inst.fn("empty")(w)) == (5, True, False)
-    assert inst.read(w) == inst.samples
+    assert [inst.fn(f)(w) for f in ("__len__", "__bool__", "empty")] == [5, True, False]
+    assert inst.value(inst.fn("pop")(w)) == inst.samples[-1]
+    inst.fn("pop_back")(w)
+    assert inst.read(w) == inst.samples[:3]
+    assert (inst.value(inst.fn("front")(w)), inst.value(inst.fn("back")(w))) == (inst.samples[0], inst.samples[2])
+    # front and back of an empty vector raise; pop_back of it does nothing.
+    for name in ("front", "back"):
+        with pytest.raises(IndexError):
+            inst.fn(name)(v)
+    inst.fn("pop_back")(v)
+    assert inst.fn("size")(v) == 0
 
 
 @by_instance
 @pytest.mark.parametrize("index, position", [(0, 0), (4, 4), (-1, 4), (-5, 0), (5, None), (-6, None), (2**31 - 1, None)])
-def test_index_normalisation(inst, index, position):
-    v = inst.make()
+def test_index_access(inst, index, position):
+    v, expected = inst.make(), list(inst.samples)
     get, set_, delete = inst.fn("__getitem__"), inst.fn("__setitem__"), inst.fn("__delitem__")
     if position is None:
         for call in (lambda: get(v, index), lambda: set_(v, index, inst.samples[0]), lambda: delete(v, index)):
             with pytest.raises(IndexError, match="^index out of range$"):
                 call()
-        assert inst.read(v) == inst.samples
-        return
-    assert inst.value(get(v, index)) == inst.samples[position]
-    replacement = inst.samples[(position + 1) % 5]
-    set_(v, index, replacement)
-    expected = list(inst.samples)
-    expected[position] = replacement
-    assert inst.read(v) == expected
-    delete(v, index)
-    del expected[position]
-    assert inst.read(v) == expected
-
-
-@by_instance
-def test_element_results_have_the_element_type(inst):
-    v = inst.make()
-    got = inst.fn("__getitem__")(v, 0)
-    if inst.text:
-        assert type(got).__name__ == "SafeString"
     else:
-        assert type(got) is type(inst.samples[0])
-
-
-@by_instance
-def test_bad_element_is_refused_before_the_index_is_looked_at(inst):
-    v = inst.make()
-    with pytest.raises(TypeError) as info:
-        inst.fn("__setitem__")(v, 99, inst.wrong)
-    assert str(info.value).startswith(f"Wrong number or type of arguments for overloaded function '{inst.prefix}___setitem__'")
-    assert inst.read(v) == inst.samples
+        got = get(v, index)
+        assert type(got).__name__ == "SafeString" if inst.text else type(got) is type(inst.samples[0])
+        assert inst.value(got) == inst.samples[position]
+        expected[position] = inst.samples[(position + 1) % 5]
+        set_(v, index, expected[position])
+        assert inst.read(v) == expected
+        delete(v, index)
+        del expected[position]
+    assert inst.read(v) == expected
+    with pytest.raises(TypeError, match=f"^Wrong number or type of arguments for overloaded function '{inst.prefix}___"):
+        set_(v, 99, inst.wrong)  # a bad element is refused before the index is looked at
 
 
 @by_instance
@@ -156,50 +134,33 @@ def test_append(inst, name):
     v = inst.new()
     for item in inst.samples:
         assert inst.fn(name)(v, item) is None
-    assert inst.read(v) == inst.samples
     with pytest.raises((TypeError, OverflowError)) as info:
         inst.fn(name)(v, inst.wrong)
-    expected = "Expected string type" if inst.text else f"in method '{inst.prefix}_{name}', argument 2 of type '{inst.value_type}'"
-    assert str(info.value) == expected
+    assert str(info.value) == ("Expected string type" if inst.text else
+                               f"in method '{inst.prefix}_{name}', argument 2 of type '{inst.value_type}'")
     assert inst.read(v) == inst.samples
 
 
 @by_instance
-def test_pop_front_back_and_pop_back(inst):
-    v = inst.make()
-    assert inst.value(inst.fn("front")(v)) == inst.samples[0]
-    assert inst.value(inst.fn("back")(v)) == inst.samples[-1]
-    assert inst.value(inst.fn("pop")(v)) == inst.samples[-1]
-    assert inst.fn("pop_back")(v) is None
-    assert inst.read(v) == inst.samples[:3]
-    empty = inst.new()
-    for name in ("front", "back"):
-        with pytest.raises(IndexError):
-            inst.fn(name)(empty)
-    inst.fn("pop_back")(empty)
-    assert inst.fn("size")(empty) == 0
-
-
-@by_instance
-def test_swap_clear_assign_resize_reserve(inst):
+def test_swap_assign_resize_reserve_clear(inst):
     v, w = inst.make(), inst.make(inst.samples[:2])
     inst.fn("swap")(v, w)
     assert (inst.read(v), inst.read(w)) == (inst.samples[:2], inst.samples)
-    with pytest.raises(ValueError, match=r"^invalid null reference in method '\w+_swap', argument 2 of type 'std::vector< .* > &'$"):
+    with pytest.raises(ValueError) as info:
         inst.fn("swap")(v, None)
+    assert str(info.value) == f"invalid null reference in method '{inst.prefix}_swap', argument 2 of type '{inst.container} &'"
     inst.fn("assign")(v, 3, inst.samples[1])
-    assert inst.read(v) == [inst.samples[1]] * 3
     inst.fn("resize")(v, 4, inst.samples[0])
-    assert inst.read(v) == [inst.samples[1]] * 3 + [inst.samples[0]]
     inst.fn("resize")(v, 6)
     default = {"vectorb": False, "vectorss": ""}.get(inst.prefix, 0)
-    assert inst.read(v)[4:] == [default, default]
-    inst.fn("resize")(v, 1)
-    assert inst.read(v) == [inst.samples[1]]
+    assert inst.read(v) == [inst.samples[1]] * 3 + [inst.samples[0], default, default]
     inst.fn("reserve")(v, 100)
     assert inst.fn("capacity")(v) >= 100
     inst.fn("clear")(v)
     assert inst.fn("size")(v) == 0
+    if not inst.packed:  # so many elements cannot fit a 32-bit process
+        with pytest.raises(MemoryError):
+            inst.fn("reserve")(v, 2**32 - 1)
 
 
 @by_instance
@@ -208,11 +169,8 @@ def test_swap_clear_assign_resize_reserve(inst):
     [
         ("reserve", (-1,), 2, OverflowError, "size_type"),
         ("reserve", (2**32,), 2, OverflowError, "size_type"),
-        ("reserve", (1.0,), 2, TypeError, "size_type"),
-        ("assign", (2**32, None), 2, OverflowError, "size_type"),
+        ("assign", (1.0, None), 2, TypeError, "size_type"),
         ("__getslice__", (2**31, 0), 2, OverflowError, "difference_type"),
-        ("__getslice__", ("0", 0), 2, TypeError, "difference_type"),
-        ("__delslice__", (0, -(2**31) - 1), 3, OverflowError, "difference_type"),
         ("__delslice__", (0, 1.5), 3, TypeError, "difference_type"),
     ],
 )
@@ -220,33 +178,26 @@ def test_index_and_size_arguments(inst, member, args, position, error, arg_type)
     v = inst.make()
     with pytest.raises(error) as info:
         inst.fn(member)(v, *args)
-    assert type(info.value) is error
     assert str(info.value) == f"in method '{inst.prefix}_{member}', argument {position} of type '{inst.container}::{arg_type}'"
     assert inst.read(v) == inst.samples
 
 
 @by_instance
 def test_self_of_the_wrong_type(inst):
-    other = next(i for i in INSTANCES if i is not inst).make()
+    other = INSTANCES[(INSTANCES.index(inst) + 1) % 6].make()
     with pytest.raises(TypeError, match=rf"^in method '{inst.prefix}_pop', argument 1 of type '{inst.container} \*'$"):
         inst.fn("pop")(other)
     with pytest.raises(TypeError, match=rf"^in method '{inst.prefix}_empty', argument 1 of type '{inst.container} const \*'$"):
         inst.fn("empty")(3)
 
 
-def overload_text(name, *prototypes):
-    lines = "".join(f"    {p}\n" for p in prototypes)
-    return f"Wrong number or type of arguments for overloaded function '{name}'.\n  Possible C/C++ prototypes are:\n{lines}"
-
-
 @by_instance
 def test_overload_messages(inst):
     c, d, s = inst.container, inst.container + "::difference_type", inst.container + "::size_type"
     it, vt, src = inst.container + "::iterator", inst.value_type, inst.source + " const &"
-    const = "" if inst.packed else " const"
     v = inst.make()
     cases = {
-        "__getitem__": ((v, 1.0), [f"{c}::__getitem__(PySliceObject *)", f"{c}::__getitem__({d}){const}"]),
+        "__getitem__": ((v, 1.0), [f"{c}::__getitem__(PySliceObject *)", f"{c}::__getitem__({d})" + ("" if inst.packed else " const")]),
         "__setitem__": ((v, 1.0, 1), [f"{c}::__setitem__(PySliceObject *,{src})", f"{c}::__setitem__(PySliceObject *)",
                                       f"{c}::__setitem__({d},{vt})"]),
         "__delitem__": ((v, None), [f"{c}::__delitem__({d})", f"{c}::__delitem__(PySliceObject *)"]),
@@ -254,143 +205,95 @@ def test_overload_messages(inst):
         "erase": ((v, 0), [f"{c}::erase({it})", f"{c}::erase({it},{it})"]),
         "resize": ((v, -1), [f"{c}::resize({s})", f"{c}::resize({s},{vt})"]),
         "insert": ((v, None, 1), [f"{c}::insert({it},{vt})", f"{c}::insert({it},{s},{vt})"]),
-        "new": ((1, 2, 3), [f"{c}::vector()", f"{c}::vector({c} const &)", f"{c}::vector({s})", f"{c}::vector({s},{vt})"]),
+        "new": ((1.5,), [f"{c}::vector()", f"{c}::vector({c} const &)", f"{c}::vector({s})", f"{c}::vector({s},{vt})"]),
     }
     for member, (args, prototypes) in cases.items():
         name = function_name(inst.prefix, member)
         with pytest.raises(TypeError) as info:
             getattr(m, name)(*args)
-        text = overload_text(name, *prototypes)
-        if member == "new":  # too many arguments: the count message comes first
-            text = f"{name} expected at most 2 arguments, got 3\nAdditional information:\n" + text
-        assert str(info.value) == text
+        assert str(info.value) == overload_text(name, *prototypes)
     assert inst.read(v) == inst.samples
 
 
 @by_instance
-def test_constructors(inst):
+def test_constructors_and_allocator(inst):
     assert inst.read(inst.new()) == []
-    assert inst.read(inst.new(3)) == [inst.read(inst.new(1))[0]] * 3
     assert inst.read(inst.new(2, inst.samples[3])) == [inst.samples[3]] * 2
+    assert len(set(map(repr, inst.read(inst.new(3))))) == 1
     original = inst.make()
     copy = inst.new(original)
     inst.fn("clear")(original)
     assert inst.read(copy) == inst.samples
-    assert copy.own() is True  # new vectors are owned
-    assert repr(copy).startswith(f"<Swig Object of type '{inst.container[:-2]}")  # and handed out without a class
-
-
-@by_instance
-def test_get_allocator(inst):
-    allocator = inst.fn("get_allocator")(inst.make())
-    assert allocator.own() is True
-    assert f"std::allocator< {inst.container[13:-2]} > *" in repr(allocator)
+    assert copy.own() is True and repr(copy).startswith(f"<Swig Object of type '{inst.container[:-2]}")
+    allocator = inst.fn("get_allocator")(copy)
+    assert allocator.own() is True and f"std::allocator< {inst.container[13:-2]} > *" in repr(allocator)
 
 
 @by_instance
 def test_erase_and_insert_with_iterators(inst):
-    v = inst.make()
-    begin = inst.fn("begin")(v)
-    second = m.SwigPyIterator___add__(begin, 1)
-    at = inst.fn("erase")(v, second)
-    assert inst.read(v) == inst.samples[:1] + inst.samples[2:]
-    assert inst.value(m.SwigPyIterator_value(at)) == inst.samples[2]
-    at = inst.fn("insert")(v, at, inst.samples[1])
-    assert inst.read(v) == inst.samples
-    assert inst.value(m.SwigPyIterator_value(at)) == inst.samples[1]
-    assert inst.fn("insert")(v, inst.fn("end")(v), 2, inst.samples[0]) is None
-    assert inst.read(v) == inst.samples + [inst.samples[0]] * 2
+    v, s = inst.make(), inst.samples
+    at = inst.fn("erase")(v, m.SwigPyIterator___add__(inst.fn("begin")(v), 1))
+    assert inst.read(v) == s[:1] + s[2:] and inst.value(m.SwigPyIterator_value(at)) == s[2]
+    at = inst.fn("insert")(v, at, s[1])
+    assert inst.read(v) == s and inst.value(m.SwigPyIterator_value(at)) == s[1]
+    assert inst.fn("insert")(v, inst.fn("end")(v), 2, s[0]) is None
     first = inst.fn("begin")(v)
-    last = m.SwigPyIterator___add__(first, 3)
-    at = inst.fn("erase")(v, first, last)
-    assert inst.read(v) == inst.samples[3:] + [inst.samples[0]] * 2
-    assert inst.value(m.SwigPyIterator_value(at)) == inst.samples[3]
-    # The closed iterator of `iterator` is a forward position of this instance too.
-    inst.fn("erase")(v, inst.fn("iterator")(v))
-    assert inst.read(v) == inst.samples[4:] + [inst.samples[0]] * 2
+    at = inst.fn("erase")(v, first, m.SwigPyIterator___add__(first, 3))
+    assert inst.read(v) == s[3:] + [s[0]] * 2 and inst.value(m.SwigPyIterator_value(at)) == s[3]
+    inst.fn("erase")(v, inst.fn("iterator")(v))  # a closed iterator is a forward position too
+    assert inst.read(v) == s[4:] + [s[0]] * 2
 
 
 @by_instance
 def test_erase_refuses_other_iterators(inst):
-    v = inst.make()
-    other = next(i for i in INSTANCES if i is not inst)
-    message = f"in method '{inst.prefix}_erase', argument 2 of type '{inst.container}::iterator'"
+    v, w = inst.make(), inst.make()
+    other = INSTANCES[(INSTANCES.index(inst) + 1) % 6]
     for wrong in (inst.fn("rbegin")(v), other.fn("begin")(other.make())):
         with pytest.raises(TypeError) as info:
             inst.fn("erase")(v, wrong)
-        assert str(info.value) == message
-    assert inst.read(v) == inst.samples
-
-
-@by_instance
-def test_iterator_of_another_vector_is_refused_without_harm(inst):
-    v, w = inst.make(), inst.make()
-    with pytest.raises(IndexError):
-        inst.fn("erase")(v, inst.fn("begin")(w))
-    with pytest.raises(IndexError):
-        inst.fn("erase")(v, inst.fn("end")(v))
+        assert str(info.value) == f"in method '{inst.prefix}_erase', argument 2 of type '{inst.container}::iterator'"
+    # Positions outside this vector are refused rather than followed.
+    for outside in (inst.fn("begin")(w), inst.fn("end")(v)):
+        with pytest.raises(IndexError):
+            inst.fn("erase")(v, outside)
     assert inst.read(v) == inst.read(w) == inst.samples
-
-
-def test_bool_vector_reads_bools():
-    v = m.new_vectorb([True, False])
-    assert [m.vectorb___getitem__(v, i) for i in (0, 1)] == [True, False]
-    assert all(type(m.vectorb___getitem__(v, i)) is bool for i in (0, 1))
-    assert m.vectorb_pop(v) is False
 
 
 @pytest.mark.parametrize("member", ["__getitem__", "front", "back"])
 def test_string_elements_keep_their_vector_alive(member):
-    v = m.new_vectorss(["x", "y"])
     vector = companion.classes["vectorss"]()
     m.vectorss_append(vector, "kept")
     element = getattr(m, "vectorss_" + member)(*((vector, 0) if member == "__getitem__" else (vector,)))
-    assert element.__swig_container is vector
+    assert element.__swig_container is vector and element.this.own() is False
     alive = weakref.ref(vector)
     del vector
     gc.collect()
-    assert alive() is not None
-    assert m.SafeString_Value(element) == "kept"
+    assert alive() is not None and m.SafeString_Value(element) == "kept"
     del element
     gc.collect()
     assert alive() is None
-    assert m.SafeString_Value(m.vectorss___getitem__(v, 1)) == "y"
-
-
-def test_popped_string_is_an_owned_copy():
-    v = m.new_vectorss(["first", "second"])
-    last = m.vectorss_pop(v)
-    m.vectorss_append(v, "other")
-    assert m.SafeString_Value(last) == "second"
-    assert last.this.own()
+    popped = m.vectorss_pop(m.new_vectorss(["copy"]))
+    assert popped.this.own() is True and not hasattr(popped, "__swig_container")
 
 
 def test_undefined_cases_do_not_crash_the_interpreter():
     code = """
 import _Client3 as m
 for p in ("vectorb", "vectord", "vectorss"):
+    f = lambda name, *a: getattr(m, p + "_" + name)(*a)
     v = getattr(m, "new_" + p)()
-    for f in ("front", "back"):
-        try:
-            getattr(m, p + "_" + f)(v)
-        except IndexError:
-            pass
-    getattr(m, p + "_pop_back")(v)
-    end = getattr(m, p + "_end")(v)
-    try:
-        m.SwigPyIterator_value(end)
-    except StopIteration:
-        pass
+    f("pop_back", v)
     w = getattr(m, "new_" + p)(1000)
-    it = getattr(m, p + "_begin")(w)
-    getattr(m, p + "_clear")(w)
-    getattr(m, p + "_reserve")(w, 100000)
-    try:
-        m.SwigPyIterator_value(it)
-    except StopIteration:
-        pass
+    it = f("begin", w)
+    f("clear", w)
+    f("reserve", w, 100000)
+    for call in (lambda: f("front", v), lambda: f("back", v), lambda: m.SwigPyIterator_value(f("end", v)),
+                 lambda: m.SwigPyIterator_value(it), lambda: f("insert", v, it, 1)):
+        try:
+            call()
+        except (IndexError, StopIteration, TypeError):
+            pass
 print("survived")
 """
-    code_, out, err = run_python(code)
-    assert code_ == 0, err
-    assert "survived" in out
+    status, out, err = run_python(code)
+    assert status == 0 and "survived" in out.splitlines(), err
