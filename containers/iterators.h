@@ -143,16 +143,18 @@ class SwigPyIteratorOpen_T : public SwigPyForwardIteratorOpen_T<OutIter, ValueTy
   SwigPyIterator* copy() const override { return new SwigPyIteratorOpen_T(*this); }
 };
 
-template <class OutIter, class ValueType, class FromOper = from_oper<ValueType>>
+template <class OutIter, class ValueType, class FromOper = from_oper<ValueType>, class Seq = std::vector<ValueType>>
 class SwigPyForwardIteratorClosed_T : public SwigPyIterator_T<OutIter> {
  public:
   using base = SwigPyIterator_T<OutIter>;
+  using Range = Extent<Seq, OutIter>;
 
-  SwigPyForwardIteratorClosed_T(OutIter pos, OutIter first, OutIter last, PyObject* seq)
-      : base(pos, seq), begin(first), end(last) {}
+  SwigPyForwardIteratorClosed_T(OutIter pos, OutIter first, OutIter last, Range range, PyObject* seq)
+      : base(pos, seq), begin(first), end(last), range_(range) {}
 
+  // A vector that changed size since the iterator was made is not read outside its elements.
   PyObject* value() const override {
-    if (this->current == end) throw stop_iteration();
+    if (this->current == end || !range_.holds(this->current)) throw stop_iteration();
     return FromOper()(static_cast<const ValueType&>(*this->current));
   }
   SwigPyIterator* incr(std::size_t n = 1) override {
@@ -166,12 +168,13 @@ class SwigPyForwardIteratorClosed_T : public SwigPyIterator_T<OutIter> {
 
  protected:
   OutIter begin, end;
+  Range range_;
 };
 
-template <class OutIter, class ValueType, class FromOper = from_oper<ValueType>>
-class SwigPyIteratorClosed_T : public SwigPyForwardIteratorClosed_T<OutIter, ValueType, FromOper> {
+template <class OutIter, class ValueType, class FromOper = from_oper<ValueType>, class Seq = std::vector<ValueType>>
+class SwigPyIteratorClosed_T : public SwigPyForwardIteratorClosed_T<OutIter, ValueType, FromOper, Seq> {
  public:
-  using base = SwigPyForwardIteratorClosed_T<OutIter, ValueType, FromOper>;
+  using base = SwigPyForwardIteratorClosed_T<OutIter, ValueType, FromOper, Seq>;
   using base::base;
 
   SwigPyIterator* decr(std::size_t n = 1) override {

@@ -205,7 +205,7 @@ struct Vector {
 
   // Targets.
   static constexpr auto iterator = [](Held<V> s) {
-    return Iterator{new Closed(s.v->begin(), s.v->begin(), s.v->end(), s.object)};
+    return Iterator{new Closed(s.v->begin(), s.v->begin(), s.v->end(), {s.v}, s.object)};
   };
   static constexpr auto nonzero = [](const V* v) { return !v->empty(); };
   static constexpr auto size = [](const V* v) { return Count{v->size()}; };

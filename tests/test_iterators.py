@@ -156,7 +156,7 @@ def test_values_are_copies_and_bits_are_bools():
     assert m.SwigPyIterator___sub__(m.vectorb_end(b), m.vectorb_begin(b)) == 3
 
 
-def test_open_iterator_outside_the_vector_is_not_read():
+def test_iterator_outside_the_vector_is_not_read():
     code = """
 import _Client3 as m
 v = m.new_vectord([1.0, 2.0])
@@ -168,6 +168,14 @@ for it, step in ((m.vectord_end(v), 1000), (m.vectord_rend(v), 1), (m.vectord_be
             raise SystemExit("read outside the vector")
         except StopIteration:
             pass
+closed = m.vectord_iterator(v)
+m.vectord_clear(v)
+m.vectord_reserve(v, 100000)  # the elements it walked are gone
+try:
+    m.SwigPyIterator_value(closed)
+    raise SystemExit("read a released element")
+except StopIteration:
+    pass
 print("ok")
 """
     status, out, err = run_python(code)
