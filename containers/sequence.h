@@ -1,0 +1,229 @@
+// The six element types of the vectors, their spellings, and the conversion of a script object to
+// a whole vector: a vector proxy of the right instance is used as it is; any other script sequence
+// whose elements all convert is copied into a new vector.
+#pragma once
+
+#include <cstdio>
+#include <memory>
+#include <stdexcept>
+#include <vector>
+
+#include "convert/scalar.h"
+#include "convert/text.h"
+#include "runtime/runtime.h"
+#include "runtime/text.h"
+#include "runtime/types.h"
+#include "ZarvoSDKClientCPP/SafeString.h"
+
+namespace client3 {
+
+using ZarvoSDKClientCPP::SafeString;
+
+// A str or bytes as an owning SafeString (its text duplicated through the library's factory, so
+// the vector never refers to a script object's buffer). With no destination the object is only
+// tested. A str that cannot be encoded leaves its encoding error pending and gives Raised.
+inline int AsSafeString(PyObject* o, SafeString* out) {
+  const char* text;
+  if (PyUnicode_Check(o)) {
+    if (!out) return ResultOk;
+    text = PyUnicode_AsUTF8AndSize(o, nullptr);  // the text ends at an embedded NUL
+    if (!text) return Raised;
+  } else if (PyBytes_Check(o)) {
+    if (!out) return ResultOk;
+    text = PyBytes_AS_STRING(o);
+  } else {
+    return ErrTypeError;
+  }
+  *out = SafeString(ZarvoSDKClientCPP::VStringFactory::Instance(), text);
+  return ResultOk;
+}
+
+// Per element type: the prefix of its vector's functions, the spelling inside "std::vector< ... >" and the argument conversion.
+template <class T>
+struct ElementTraits;
+template <>
+struct ElementTraits<bool> {
+  static constexpr Text prefix = "vectorb";
+  static constexpr Text name = "bool";
+  static constexpr auto convert = AsBool;
+};
+template <>
+struct ElementTraits<double> {
+  static constexpr Text prefix = "vectord";
+  static constexpr Text name = "double";
+  static constexpr auto convert = AsDouble;
+};
+template <>
+struct ElementTraits<float> {
+  static constexpr Text prefix = "vectorf";
+  static constexpr Text name = "float";
+  static constexpr auto convert = AsFloat;
+};
+template <>
+struct ElementTraits<int> {
+  static constexpr Text prefix = "vectori";
+  static constexpr Text name = "int";
+  static constexpr auto convert = AsInt;
+};
+template <>
+struct ElementTraits<unsigned long long> {
+  static constexpr Text prefix = "vectorull";
+  static constexpr Text name = "unsigned long long";
+  static constexpr auto convert = AsUnsignedLongLong;
+};
+template <>
+struct ElementTraits<SafeString> {
+  static constexpr Text prefix = "vectorss";
+  static constexpr Text name = "ZarvoSDKClientCPP::SafeString";
+  static constexpr auto convert = AsSafeString;
+};
+
+template <class T>
+using ElementOf = Element<T, ElementTraits<T>::name, ElementTraits<T>::convert>;
+
+// "std::vector< double >" and "std::vector< double,std::allocator< double > >".
+template <class T>
+inline constexpr auto ContainerName = cat("std::vector< ", ElementTraits<T>::name, " >");
+template <class T>
+inline constexpr auto AllocatorName =
+    cat("std::vector< ", ElementTraits<T>::name, ",std::allocator< ", ElementTraits<T>::name, " > >");
+
+// The name under which a sequence argument looks up its container descriptor. The bool one has a
+// blank after the comma that the others lack; the lookup ignores blanks, so both find theirs.
+template <class T>
+inline constexpr auto SequenceName =
+    cat("std::vector<", ElementTraits<T>::name, ",std::allocator< ", ElementTraits<T>::name, " > > *");
+template <>
+inline constexpr auto SequenceName<bool> = Text{"std::vector<bool, std::allocator< bool > > *"};
+
+template <class T>
+TypeInfo* SequenceDescriptor() {
+  static TypeInfo* const type = TypeQuery(SequenceName<T>.chars);
+  return type;
+}
+
+// One element of a sequence being converted; a refusal extends the pending message with the
+// element's index and the refusal's text, and is thrown on.
+template <class T>
+T SequenceElement(PyObject* item, Py_ssize_t index) {
+  try {
+    return ElementOf<T>::as(item);
+  } catch (const std::invalid_argument& error) {
+    char where[1024];
+    std::snprintf(where, sizeof where, "in sequence element %d ", static_cast<int>(index));
+    if (!PyErr_Occurred()) PyErr_SetString(PyExc_TypeError, ElementTraits<T>::name.chars);
+    AddErrorMsg(where);
+    AddErrorMsg(error.what());
+    throw;
+  }
+}
+
+struct ItemRef {
+  PyObject* item;
+  ~ItemRef() { Py_XDECREF(item); }
+};
+
+// Lists and tuples: their items are read in place. Converting an element runs no script code, so
+// the sequence cannot change under the loop; its length is still read before every element.
+template <class T>
+void FillFromListOrTuple(PyObject* o, std::vector<T>& out) {
+  if (PyList_CheckExact(o)) {
+    out.reserve(PyList_GET_SIZE(o));
+    for (Py_ssize_t i = 0; i < PyList_GET_SIZE(o); ++i) out.push_back(SequenceElement<T>(PyList_GET_ITEM(o, i), i));
+  } else {
+    out.reserve(PyTuple_GET_SIZE(o));
+    for (Py_ssize_t i = 0; i < PyTuple_GET_SIZE(o); ++i) out.push_back(SequenceElement<T>(PyTuple_GET_ITEM(o, i), i));
+  }
+}
+
+// Any other sequence: its length is asked again before every element, so a sequence that changes
+// while it is read is followed to its current end.
+template <class T>
+void FillFromSequence(PyObject* o, std::vector<T>& out) {
+  for (Py_ssize_t i = 0;; ++i) {
+    Py_ssize_t size = PySequence_Size(o);
+    if (size < 0) throw std::invalid_argument("a sequence is expected");
+    if (i >= size) return;
+    ItemRef item{PySequence_GetItem(o, i)};
+    out.push_back(SequenceElement<T>(item.item, i));
+  }
+}
+
+template <class T>
+bool SequenceConverts(PyObject* o) {
+  if (PyList_CheckExact(o) || PyTuple_CheckExact(o)) {
+    PyObject** items = PySequence_Fast_ITEMS(o);
+    for (Py_ssize_t i = 0, n = PySequence_Fast_GET_SIZE(o); i < n; ++i)
+      if (!ElementOf<T>::check(items[i])) return false;
+    return true;
+  }
+  Py_ssize_t size = PySequence_Size(o);
+  if (size < 0) {
+    PyErr_Clear();
+    return false;
+  }
+  for (Py_ssize_t i = 0; i < size; ++i) {
+    ItemRef item{PySequence_GetItem(o, i)};
+    if (!item.item) {
+      PyErr_Clear();
+      return false;
+    }
+    if (!ElementOf<T>::check(item.item)) return false;
+  }
+  return true;
+}
+
+// A script object as a vector. With `out` null, only tests: 0 or -1, no error left. Otherwise 0
+// with the proxy's own vector (null for None), NewObjectMask with a new vector the caller deletes,
+// or -1 (an element failure leaves its message pending for the caller to replace).
+template <class T>
+int AsVector(PyObject* o, std::vector<T>** out) {
+  bool listOrTuple = PyList_CheckExact(o) || PyTuple_CheckExact(o);
+  if (!listOrTuple && (o == Py_None || GetThisProxy(o))) {
+    TypeInfo* type = SequenceDescriptor<T>();
+    void* pointer = nullptr;
+    if (!type || ConvertPtr(o, &pointer, type, 0) < 0) return ResultError;
+    if (out) *out = static_cast<std::vector<T>*>(pointer);
+    return ResultOk;
+  }
+  if (!PySequence_Check(o)) return ResultError;
+  if (!out) return SequenceConverts<T>(o) ? int(ResultOk) : int(ResultError);
+  auto made = std::make_unique<std::vector<T>>();
+  try {
+    if (listOrTuple)
+      FillFromListOrTuple(o, *made);
+    else
+      FillFromSequence(o, *made);
+  } catch (const std::exception& error) {
+    if (!PyErr_Occurred()) PyErr_SetString(PyExc_TypeError, error.what());
+    return ResultError;
+  }
+  *out = made.release();
+  return NewObjectMask;
+}
+
+// A `std::vector< T,std::allocator< T > > const &` argument: a vector proxy or a sequence. A vector
+// made for the call is deleted with the kind.
+template <class T>
+struct SequenceArg {
+  static constexpr auto type = cat(AllocatorName<T>, " const &");
+  static constexpr bool reference = true;
+  std::vector<T>* value = nullptr;
+  bool made = false;
+
+  SequenceArg() = default;
+  SequenceArg(const SequenceArg&) = delete;
+  ~SequenceArg() {
+    if (made) delete value;
+  }
+  int load(PyObject* o) {
+    int code = AsVector<T>(o, &value);
+    made = code >= 0 && (code & NewObjectMask);
+    return code;
+  }
+  const std::vector<T>& get() const { return *value; }
+  bool null() const { return !value; }
+  static bool check(PyObject* o) { return AsVector<T>(o, nullptr) >= 0; }
+};
+
+}  // namespace client3

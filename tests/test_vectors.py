@@ -1,0 +1,299 @@
+"""The container protocol of the six vector types, table-driven over the instances."""
+import gc
+import weakref
+
+import pytest
+
+import _Client3 as m
+import companion
+from conftest import run_python
+
+
+class Instance:
+    def __init__(self, prefix, element, samples, wrong):
+        self.prefix, self.samples, self.wrong = prefix, samples, wrong  # five distinct elements; one refused
+        self.container = f"std::vector< {element} >"
+        self.source = f"std::vector< {element},std::allocator< {element} > >"
+        self.packed, self.text = element == "bool", prefix == "vectorss"
+        self.value_type = self.container + ("::value_type" if self.packed else "::value_type const &")
+
+    def __repr__(self):
+        return self.prefix
+
+    def fn(self, name):
+        return getattr(m, f"{self.prefix}_{name}")
+
+    def new(self, *args):
+        return getattr(m, "new_" + self.prefix)(*args)
+
+    def make(self, items=None):
+        return self.new(list(self.samples if items is None else items))
+
+    def value(self, obj):
+        return m.SafeString_Value(obj) if self.text else obj
+
+    def read(self, v):
+        return [self.value(self.fn("__getitem__")(v, i)) for i in range(self.fn("size")(v))]
+
+
+INSTANCES = [
+    Instance("vectorb", "bool", [True, False, False, True, True], 1),
+    Instance("vectord", "double", [0.5, 1.5, -2.25, 3.0, 1e300], "1.0"),
+    Instance("vectorf", "float", [0.5, 1.5, -2.25, 3.0, 1024.0], 1e39),
+    Instance("vectori", "int", [1, -2, 3, 2**31 - 1, -(2**31)], 2**31),
+    Instance("vectorull", "unsigned long long", [0, 2**31 - 1, 2**31, 2**64 - 1, 5], -1),
+    Instance("vectorss", "ZarvoSDKClientCPP::SafeString", ["a", "bc", "", "d\u00e9", "e"], 3),
+]
+by_instance = pytest.mark.parametrize("inst", INSTANCES, ids=repr)
+
+ORDER = ("iterator __nonzero__ __bool__ __len__ __getslice__ __setslice__ __delslice__ __delitem__ __getitem__ "
+         "__setitem__ pop append empty size swap begin end rbegin rend clear get_allocator pop_back erase new "
+         "push_back front back assign resize insert reserve capacity swigregister swiginit").split()
+SELF_ONLY = set("iterator __nonzero__ __bool__ __len__ pop empty size begin end rbegin rend clear get_allocator "
+                "pop_back front back capacity swigregister".split())
+OVERLOADED = set("__setslice__ __delitem__ __getitem__ __setitem__ erase resize insert new".split())
+
+
+def function_name(prefix, member):
+    return f"new_{prefix}" if member == "new" else f"{prefix}_{member}"
+
+
+def overload_text(name, *prototypes):
+    lines = "".join(f"    {p}\n" for p in prototypes)
+    return f"Wrong number or type of arguments for overloaded function '{name}'.\n  Possible C/C++ prototypes are:\n{lines}"
+
+
+def test_table_order():
+    names = [n for n in vars(m) if "vector" in n or "SwigPyIterator" in n]
+    iterator = [n for n in names if "SwigPyIterator" in n]
+    assert len(iterator) == 18 and iterator[0] == "delete_SwigPyIterator" and iterator[-1] == "SwigPyIterator_swigregister"
+    assert names[18:] == [function_name(i.prefix, f) for i in INSTANCES for f in ORDER]
+
+
+@by_instance
+def test_calling_conventions(inst):
+    """One-object functions refuse an empty call in the interpreter's words, tuple functions in ours."""
+    for member in ORDER:
+        with pytest.raises(TypeError) as info:
+            getattr(m, function_name(inst.prefix, member))(*([] if member != "new" else [1, 2, 3]))
+        text = str(info.value)
+        if member in SELF_ONLY:
+            assert "takes exactly one argument (0 given)" in text, member
+        elif member in OVERLOADED:
+            assert "Wrong number or type of arguments for overloaded function" in text, member
+        else:
+            assert " expected 2 arguments, got 0" in text or " expected 3 arguments, got 0" in text, member
+
+
+@by_instance
+def test_sizes_and_pop(inst):
+    v = inst.new()
+    assert [inst.fn(f)(v) for f in ("__len__", "size", "__bool__", "__nonzero__", "empty")] == [0, 0, False, False, True]
+    with pytest.raises(IndexError, match="^pop from empty container$"):
+        inst.fn("pop")(v)
+    w = inst.make()
+    assert [inst.fn(f)(w) for f in ("__len__", "__bool__", "empty")] == [5, True, False]
+    assert inst.value(inst.fn("pop")(w)) == inst.samples[-1]
+    inst.fn("pop_back")(w)
+    assert inst.read(w) == inst.samples[:3]
+    assert (inst.value(inst.fn("front")(w)), inst.value(inst.fn("back")(w))) == (inst.samples[0], inst.samples[2])
+    # front and back of an empty vector raise; pop_back of it does nothing.
+    for name in ("front", "back"):
+        with pytest.raises(IndexError):
+            inst.fn(name)(v)
+    inst.fn("pop_back")(v)
+    assert inst.fn("size")(v) == 0
+
+
+@by_instance
+@pytest.mark.parametrize("index, position", [(0, 0), (4, 4), (-1, 4), (-5, 0), (5, None), (-6, None), (2**31 - 1, None)])
+def test_index_access(inst, index, position):
+    v, expected = inst.make(), list(inst.samples)
+    get, set_, delete = inst.fn("__getitem__"), inst.fn("__setitem__"), inst.fn("__delitem__")
+    if position is None:
+        for call in (lambda: get(v, index), lambda: set_(v, index, inst.samples[0]), lambda: delete(v, index)):
+            with pytest.raises(IndexError, match="^index out of range$"):
+                call()
+    else:
+        got = get(v, index)
+        assert type(got).__name__ == "SafeString" if inst.text else type(got) is type(inst.samples[0])
+        assert inst.value(got) == inst.samples[position]
+        expected[position] = inst.samples[(position + 1) % 5]
+        set_(v, index, expected[position])
+        assert inst.read(v) == expected
+        delete(v, index)
+        del expected[position]
+    assert inst.read(v) == expected
+    with pytest.raises(TypeError, match=f"^Wrong number or type of arguments for overloaded function '{inst.prefix}___"):
+        set_(v, 99, inst.wrong)  # a bad element is refused before the index is looked at
+
+
+@by_instance
+@pytest.mark.parametrize("name", ["append", "push_back"])
+def test_append(inst, name):
+    v = inst.new()
+    for item in inst.samples:
+        assert inst.fn(name)(v, item) is None
+    with pytest.raises((TypeError, OverflowError)) as info:
+        inst.fn(name)(v, inst.wrong)
+    assert str(info.value) == ("Expected string type" if inst.text else
+                               f"in method '{inst.prefix}_{name}', argument 2 of type '{inst.value_type}'")
+    assert inst.read(v) == inst.samples
+
+
+@by_instance
+def test_swap_assign_resize_reserve_clear(inst):
+    v, w = inst.make(), inst.make(inst.samples[:2])
+    inst.fn("swap")(v, w)
+    assert (inst.read(v), inst.read(w)) == (inst.samples[:2], inst.samples)
+    with pytest.raises(ValueError) as info:
+        inst.fn("swap")(v, None)
+    assert str(info.value) == f"invalid null reference in method '{inst.prefix}_swap', argument 2 of type '{inst.container} &'"
+    inst.fn("assign")(v, 3, inst.samples[1])
+    inst.fn("resize")(v, 4, inst.samples[0])
+    inst.fn("resize")(v, 6)
+    default = {"vectorb": False, "vectorss": ""}.get(inst.prefix, 0)
+    assert inst.read(v) == [inst.samples[1]] * 3 + [inst.samples[0], default, default]
+    inst.fn("reserve")(v, 100)
+    assert inst.fn("capacity")(v) >= 100
+    inst.fn("clear")(v)
+    assert inst.fn("size")(v) == 0
+    if not inst.packed:  # so many elements cannot fit a 32-bit process
+        with pytest.raises(MemoryError):
+            inst.fn("reserve")(v, 2**32 - 1)
+
+
+@by_instance
+@pytest.mark.parametrize(
+    "member, args, position, error, arg_type",
+    [
+        ("reserve", (-1,), 2, OverflowError, "size_type"),
+        ("reserve", (2**32,), 2, OverflowError, "size_type"),
+        ("assign", (1.0, None), 2, TypeError, "size_type"),
+        ("__getslice__", (2**31, 0), 2, OverflowError, "difference_type"),
+        ("__delslice__", (0, 1.5), 3, TypeError, "difference_type"),
+    ],
+)
+def test_index_and_size_arguments(inst, member, args, position, error, arg_type):
+    v = inst.make()
+    with pytest.raises(error) as info:
+        inst.fn(member)(v, *args)
+    assert str(info.value) == f"in method '{inst.prefix}_{member}', argument {position} of type '{inst.container}::{arg_type}'"
+    assert inst.read(v) == inst.samples
+
+
+@by_instance
+def test_self_of_the_wrong_type(inst):
+    other = INSTANCES[(INSTANCES.index(inst) + 1) % 6].make()
+    with pytest.raises(TypeError, match=rf"^in method '{inst.prefix}_pop', argument 1 of type '{inst.container} \*'$"):
+        inst.fn("pop")(other)
+    with pytest.raises(TypeError, match=rf"^in method '{inst.prefix}_empty', argument 1 of type '{inst.container} const \*'$"):
+        inst.fn("empty")(3)
+
+
+@by_instance
+def test_overload_messages(inst):
+    c, d, s = inst.container, inst.container + "::difference_type", inst.container + "::size_type"
+    it, vt, src = inst.container + "::iterator", inst.value_type, inst.source + " const &"
+    v = inst.make()
+    cases = {
+        "__getitem__": ((v, 1.0), [f"{c}::__getitem__(PySliceObject *)", f"{c}::__getitem__({d})" + ("" if inst.packed else " const")]),
+        "__setitem__": ((v, 1.0, 1), [f"{c}::__setitem__(PySliceObject *,{src})", f"{c}::__setitem__(PySliceObject *)",
+                                      f"{c}::__setitem__({d},{vt})"]),
+        "__delitem__": ((v, None), [f"{c}::__delitem__({d})", f"{c}::__delitem__(PySliceObject *)"]),
+        "__setslice__": ((v, 0), [f"{c}::__setslice__({d},{d})", f"{c}::__setslice__({d},{d},{src})"]),
+        "erase": ((v, 0), [f"{c}::erase({it})", f"{c}::erase({it},{it})"]),
+        "resize": ((v, -1), [f"{c}::resize({s})", f"{c}::resize({s},{vt})"]),
+        "insert": ((v, None, 1), [f"{c}::insert({it},{vt})", f"{c}::insert({it},{s},{vt})"]),
+        "new": ((1.5,), [f"{c}::vector()", f"{c}::vector({c} const &)", f"{c}::vector({s})", f"{c}::vector({s},{vt})"]),
+    }
+    for member, (args, prototypes) in cases.items():
+        name = function_name(inst.prefix, member)
+        with pytest.raises(TypeError) as info:
+            getattr(m, name)(*args)
+        assert str(info.value) == overload_text(name, *prototypes)
+    assert inst.read(v) == inst.samples
+
+
+@by_instance
+def test_constructors_and_allocator(inst):
+    assert inst.read(inst.new()) == []
+    assert inst.read(inst.new(2, inst.samples[3])) == [inst.samples[3]] * 2
+    assert len(set(map(repr, inst.read(inst.new(3))))) == 1
+    original = inst.make()
+    copy = inst.new(original)
+    inst.fn("clear")(original)
+    assert inst.read(copy) == inst.samples
+    assert copy.own() is True and repr(copy).startswith(f"<Swig Object of type '{inst.container[:-2]}")
+    allocator = inst.fn("get_allocator")(copy)
+    assert allocator.own() is True and f"std::allocator< {inst.container[13:-2]} > *" in repr(allocator)
+
+
+@by_instance
+def test_erase_and_insert_with_iterators(inst):
+    v, s = inst.make(), inst.samples
+    at = inst.fn("erase")(v, m.SwigPyIterator___add__(inst.fn("begin")(v), 1))
+    assert inst.read(v) == s[:1] + s[2:] and inst.value(m.SwigPyIterator_value(at)) == s[2]
+    at = inst.fn("insert")(v, at, s[1])
+    assert inst.read(v) == s and inst.value(m.SwigPyIterator_value(at)) == s[1]
+    assert inst.fn("insert")(v, inst.fn("end")(v), 2, s[0]) is None
+    first = inst.fn("begin")(v)
+    at = inst.fn("erase")(v, first, m.SwigPyIterator___add__(first, 3))
+    assert inst.read(v) == s[3:] + [s[0]] * 2 and inst.value(m.SwigPyIterator_value(at)) == s[3]
+    inst.fn("erase")(v, inst.fn("iterator")(v))  # a closed iterator is a forward position too
+    assert inst.read(v) == s[4:] + [s[0]] * 2
+
+
+@by_instance
+def test_erase_refuses_other_iterators(inst):
+    v, w = inst.make(), inst.make()
+    other = INSTANCES[(INSTANCES.index(inst) + 1) % 6]
+    for wrong in (inst.fn("rbegin")(v), other.fn("begin")(other.make())):
+        with pytest.raises(TypeError) as info:
+            inst.fn("erase")(v, wrong)
+        assert str(info.value) == f"in method '{inst.prefix}_erase', argument 2 of type '{inst.container}::iterator'"
+    # Positions outside this vector are refused rather than followed.
+    for outside in (inst.fn("begin")(w), inst.fn("end")(v)):
+        with pytest.raises(IndexError):
+            inst.fn("erase")(v, outside)
+    assert inst.read(v) == inst.read(w) == inst.samples
+
+
+@pytest.mark.parametrize("member", ["__getitem__", "front", "back"])
+def test_string_elements_keep_their_vector_alive(member):
+    vector = companion.classes["vectorss"]()
+    m.vectorss_append(vector, "kept")
+    element = getattr(m, "vectorss_" + member)(*((vector, 0) if member == "__getitem__" else (vector,)))
+    assert element.__swig_container is vector and element.this.own() is False
+    alive = weakref.ref(vector)
+    del vector
+    gc.collect()
+    assert alive() is not None and m.SafeString_Value(element) == "kept"
+    del element
+    gc.collect()
+    assert alive() is None
+    popped = m.vectorss_pop(m.new_vectorss(["copy"]))
+    assert popped.this.own() is True and not hasattr(popped, "__swig_container")
+
+
+def test_undefined_cases_do_not_crash_the_interpreter():
+    code = """
+import _Client3 as m
+for p in ("vectorb", "vectord", "vectorss"):
+    f = lambda name, *a: getattr(m, p + "_" + name)(*a)
+    v = getattr(m, "new_" + p)()
+    f("pop_back", v)
+    w = getattr(m, "new_" + p)(1000)
+    it = f("begin", w)
+    f("clear", w)
+    f("reserve", w, 100000)
+    for call in (lambda: f("front", v), lambda: f("back", v), lambda: m.SwigPyIterator_value(f("end", v)),
+                 lambda: m.SwigPyIterator_value(it), lambda: f("insert", v, it, 1)):
+        try:
+            call()
+        except (IndexError, StopIteration, TypeError):
+            pass
+print("survived")
+"""
+    status, out, err = run_python(code)
+    assert status == 0 and "survived" in out.splitlines(), err
