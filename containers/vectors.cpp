@@ -81,6 +81,13 @@ struct TextElement {
   const SafeString& get() const { return value; }
 };
 
+// An argument that overload dispatch does not test: the form is chosen by the others, and this one
+// reports its own failure when converted.
+template <class K>
+struct Unchecked : K {
+  static bool check(PyObject*) { return true; }
+};
+
 template <class T, Text Type>
 using ValueArg = std::conditional_t<std::is_same_v<T, SafeString>, TextElement<Type>,
                                     ScalarKind<T, Type, ElementTraits<T>::convert>>;
@@ -313,7 +320,9 @@ struct Vector {
                  OverloadsOf<T, "__setitem__", cat("__setitem__(PySliceObject *,", Source, ")"),
                          Text{"__setitem__(PySliceObject *)"}, cat("__setitem__(", Difference, ",", ValueType, ")")>,
                  Form<setitemSlice, Self, SliceArg, Seq>, Form<delitemSlice, Self, SliceArg>,
-                 Form<setitem, Self, Diff, Value>>,
+                 // The element is converted before the index is tested, so a bad element is reported
+                 // as argument 3 whatever the index.
+                 Form<setitem, Self, Diff, Unchecked<Value>>>,
       F<"pop", Object, pop, Self>,
       F<"append", Tuple, append, Self, Value>,
       F<"empty", Object, [](const V* v) { return v->empty(); }, ConstSelf>,

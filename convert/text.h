@@ -42,7 +42,7 @@ struct String {
   int load(PyObject* o) {
     if (PyUnicode_Check(o)) {
       // The UTF-8 form is kept by the str object itself, so nothing is copied.
-      if (const char* utf8 = PyUnicode_AsUTF8(o)) value.ViewText = utf8;
+      if (const char* utf8 = PyUnicode_AsUTF8AndSize(o, nullptr)) value.ViewText = utf8;
       return ResultOk;
     }
     if (PyBytes_Check(o)) {

@@ -83,7 +83,9 @@ def test_registration_functions_pair_with_classes():
     assert "SafeString" in registered
     assert initialised <= registered
     assert initialised == {cls for cls in registered if "new_" + cls in names}
-    assert all("delete_" + cls in names for cls in initialised)
+    # The vectors are made by scripts but have no destructor function of their own.
+    assert {cls for cls in initialised if "delete_" + cls not in names} <= {
+        "vectorb", "vectord", "vectorf", "vectori", "vectorull", "vectorss"}
 
 
 # Every module function is called with many wrong arguments in a fresh interpreter; each call must
