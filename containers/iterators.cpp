@@ -37,9 +37,9 @@ void RelationErrors() {
   }
 }
 
-using Self = Pointer<SwigPyIterator, "swig::SwigPyIterator *">;
-using ConstSelf = Pointer<const SwigPyIterator, "swig::SwigPyIterator const *">;
-using Disowned = Pointer<SwigPyIterator, "swig::SwigPyIterator *", Null::Allow, PointerDisown>;
+using Self = client3::Self<SwigPyIterator>;
+using ConstSelf = client3::ConstSelf<SwigPyIterator>;
+using Disowned = client3::Disowned<SwigPyIterator>;
 using Other = Pointer<const SwigPyIterator, "swig::SwigPyIterator const &">;
 using Steps = ScalarKind<unsigned int, "size_t", AsUnsignedInt>;
 using Offset = ScalarKind<int, "ptrdiff_t", AsInt>;

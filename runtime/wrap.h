@@ -84,6 +84,8 @@ CLIENT3_NAME_OF(SafeString)
 CLIENT3_NAME_OF(Type_Parameter)
 CLIENT3_NAME_OF(ZarvoPelluxPostClient)
 #undef CLIENT3_NAME_OF
+template <>
+inline constexpr auto NameOf<swig::SwigPyIterator> = Text{"swig::SwigPyIterator"};
 
 enum class Null { Refuse, Allow };
 
