@@ -23,6 +23,14 @@ def peer(tmp_path_factory):
     return build.peer(lambda: tmp_path_factory.mktemp("peer"))
 
 
+@pytest.fixture
+def safe_string_class():
+    """Lets a test register its own class for SafeString; the companion class is put back after."""
+    yield
+    import _Client3
+    _Client3.SafeString_swigregister(companion.classes["SafeString"])
+
+
 def run_python(code):
     """Runs `code` in a fresh interpreter; returns (exit code, stdout, stderr)."""
     done = subprocess.run([sys.executable, "-c", code], capture_output=True, text=True, timeout=120)

@@ -113,6 +113,11 @@ def text(value):
     return m.new_SafeString(value)
 
 
+def library_record(peer, name):
+    """A zero-filled record as the library hands one out (most records cannot be made by scripts)."""
+    return peer.record("_p_ZarvoSDKClientCPP__" + name)
+
+
 # ---- The table ----------------------------------------------------------------------------------
 
 
@@ -121,7 +126,6 @@ def test_record_functions_are_listed_in_table_order():
     expected = [n for record in RECORDS for n in family(*record)]
     start = listed.index("new_Type_Parameter")
     assert listed[start:start + len(expected)] == expected
-    assert len(expected) == 328
 
 
 @pytest.mark.parametrize("record", RECORDS, ids=[r[0] for r in RECORDS])
@@ -161,10 +165,11 @@ def test_record_argument_is_checked(name, field, kind):
     ("Output_Result_Error", NS + "Output_Result const *"),
     ("Output_GetCommandInfo_DefaultOutputString", NS + "Output_GetCommandInfo *"),
 ])
-def test_member_functions_check_their_record(function, type_text_):
+def test_member_functions_check_their_record(registered_classes, function, type_text_):
     message = f"in method '{function}', argument 1 of type '{type_text_}'"
-    raises(TypeError, message, fn(function), 1)
-    raises(TypeError, message, fn(function), text("x"))
+    # A Type_Parameter is a record but not an output record.
+    for wrong in (1, text("x"), registered_classes["Type_Parameter"]()):
+        raises(TypeError, message, fn(function), wrong)
     raises(ValueError, "invalid null reference " + message, fn(function), None)
 
 
@@ -190,13 +195,9 @@ def test_value_argument_is_checked(name, field, kind):
             raises(TypeError, message, fn(function), None, text("x"))
     else:
         raises(TypeError, message, fn(function), None, None)
-
-
-# (Vector values come only from records that a script cannot construct, so they are left out.)
-@pytest.mark.parametrize("name,field,kind", [f for f in FIELDS if not f[2].startswith("v")])
-def test_setter_accepts_a_null_record(name, field, kind):
-    value = text("x") if kind == "s" else {"b": True, "f": 1.5, "d": 1.5}.get(kind, 1)
-    assert fn(f"{name}_{field}_set")(None, value) is None
+    if not kind.startswith("v"):  # a good value is converted and then stored nowhere on a null record
+        value = text("x") if kind == "s" else {"b": True, "f": 1.5, "d": 1.5}.get(kind, 1)
+        assert fn(function)(None, value) is None
 
 
 # ---- Field access on live records -------------------------------------------------------------
@@ -256,22 +257,16 @@ def test_fields_of_one_record_do_not_overlap(registered_classes):
 # ---- Output_Result on every record ------------------------------------------------------------
 
 
-@pytest.mark.parametrize("name", [r[0] for r in CREATABLE if r[0] != "Type_Parameter"])
-def test_base_functions_accept_any_record(registered_classes, name):
-    record = registered_classes[name]()
+@pytest.mark.parametrize("name,made", [r[:2] for r in RECORDS if r[0] != "Type_Parameter"])
+def test_base_functions_accept_any_record(registered_classes, peer, name, made):
+    """Script-made and library-made records alike; every non-zero result is an error."""
+    record = registered_classes[name]() if made else library_record(peer, name)
     assert m.Output_Result_Result_get(record) == 0 and m.Output_Result_Error(record) is False
-    m.Output_Result_Result_set(record, 1003)
-    assert m.Output_Result_Result_get(record) == 1003 and m.Output_Result_Error(record) is True
-    m.Output_Result_Result_set(record, 0)
-    assert m.Output_Result_Error(record) is False
+    for result in (1003, 1, 0):
+        m.Output_Result_Result_set(record, result)
+        assert m.Output_Result_Result_get(record) == result and m.Output_Result_Error(record) is (result != 0)
     m.Output_Result_ResultString_set(record, text("why"))
     assert m.SafeString_Value(m.Output_Result_ResultString_get(record)) == "why"
-
-
-def test_type_parameter_is_not_an_output_record(registered_classes):
-    parameter = registered_classes["Type_Parameter"]()
-    raises(TypeError, f"in method 'Output_Result_Error', argument 1 of type '{NS}Output_Result const *'",
-           m.Output_Result_Error, parameter)
 
 
 # ---- Construction and ownership ---------------------------------------------------------------
@@ -307,18 +302,9 @@ def test_records_are_released_without_leaks():
 
 # ---- DefaultOutputString ----------------------------------------------------------------------
 
-EMPTY_COMMAND = ("Cmd\nDoes it\n----------------\nInput Parameters\n----------------\nNone\n"
-                 "-----------------\nOutput Parameters\n-----------------\nNone\n")
-
-
-def test_default_output_string_refuses_a_null_record():
-    raises(ValueError, "invalid null reference in method 'Output_GetCommandInfo_DefaultOutputString', "
-           f"argument 1 of type '{NS}Output_GetCommandInfo *'", m.Output_GetCommandInfo_DefaultOutputString, None)
-
-
 def command(peer, name, description, inputs=(), outputs=()):
     """A command description as the library hands it out."""
-    record = peer.record("_p_ZarvoSDKClientCPP__Output_GetCommandInfo")
+    record = library_record(peer, "Output_GetCommandInfo")
     if name is not None:
         m.Output_GetCommandInfo_Name_set(record, peer.library_text(name))
         m.Output_GetCommandInfo_Description_set(record, peer.library_text(description))
@@ -353,9 +339,6 @@ def test_default_output_string_layout(peer, name, description, inputs, outputs, 
 
 # ---- Records as the library hands them out -----------------------------------------------------
 
-def library_record(peer, name):
-    return peer.record("_p_ZarvoSDKClientCPP__" + name)
-
 
 @pytest.mark.parametrize("value", [0, 2**31 - 1, 2**31, 2**63, 2**64 - 1])
 def test_unsigned_long_long_fields_come_back_exactly(peer, value):
@@ -363,14 +346,6 @@ def test_unsigned_long_long_fields_come_back_exactly(peer, value):
     m.Output_GetObject_ID_set(record, value)
     got = m.Output_GetObject_ID_get(record)
     assert type(got) is int and got == value
-
-
-@pytest.mark.parametrize("result, error", [(0, False), (1003, True), (1, True)])
-def test_error_of_any_record(peer, result, error):
-    record = library_record(peer, "Output_GetTrajectoryAtFrame")
-    m.Output_Result_Result_set(record, result)
-    assert m.Output_Result_Error(record) is error
-    assert m.Output_Result_Result_get(record) == result
 
 
 def test_parameter_vectors_move_between_records_as_copies(peer):

@@ -3,7 +3,6 @@ and running either module's initialisation again relinks nothing."""
 import ctypes
 import sys
 
-import pytest
 
 import _Client3
 import companion
@@ -13,7 +12,6 @@ from peer import build
 CAPSULE = "swig_runtime_data4.type_pointer_capsulePelluxPostSDKClientPython3"
 SAFE_STRING = "_p_ZarvoSDKClientCPP__SafeString"
 OUTPUT_RESULT = "_p_ZarvoSDKClientCPP__Output_Result"
-BASES = [OUTPUT_RESULT, "_p_ZarvoSDKClientCPP__ZarvoClient", "_p_ZarvoSDKClientCPP__IStringFactory"]
 
 
 def capsule_pointer():
@@ -25,7 +23,7 @@ def capsule_pointer():
 
 
 def snapshot(peer):
-    """The ring and every cast list, as sets (conversions reorder the lists)."""
+    """The ring and every cast list, sorted (conversions reorder the lists; duplicates still show)."""
     return peer.ring(), {name: sorted(peer.casts(name)) for name in peer.names()}
 
 
@@ -35,13 +33,8 @@ def initialise_again(path, entry):
     return function()
 
 
-def test_capsule_is_published_by_the_first_module():
-    runtime = sys.modules["swig_runtime_data4"]
-    capsule = runtime.type_pointer_capsulePelluxPostSDKClientPython3
-    assert repr(capsule).startswith('<capsule object "%s" at ' % CAPSULE)
-
-
 def test_peer_joins_the_ring_after_its_head(peer):
+    """The first module publishes the capsule (read back under its exact name) and heads the ring."""
     ring = peer.ring()
     assert len(ring) == len(set(ring)) == 2
     assert ring[0] == capsule_pointer()
@@ -53,12 +46,6 @@ def test_peer_reuses_every_descriptor_of_the_first_module(peer):
         head, used, own = peer.descriptor(name)
         assert head == used != own, name
     assert peer.proxy_type(_Client3.new_SafeString()) == peer.descriptor(SAFE_STRING)[0]
-
-
-def test_joining_added_no_cast_entries(peer):
-    casts = peer.casts(OUTPUT_RESULT)
-    assert len(casts) == len(set(casts)) == 42
-    assert all(len(peer.casts(name)) == 2 for name in BASES[1:])
 
 
 def test_proxies_cross_between_modules(peer):
@@ -87,8 +74,6 @@ def test_initialising_again_relinks_nothing(peer):
     peer_again = [initialise_again(peer.__file__, "PyInit__Client3Peer") for _ in range(2)]
     assert all(module is not peer for module in peer_again)
     assert snapshot(peer) == before
-    casts = peer.casts(OUTPUT_RESULT)
-    assert len(casts) == len(set(casts)) == 42
     # Conversions still work, through both modules and the new module objects.
     trajectory = peer.make("_p_ZarvoSDKClientCPP__Output_GetTrajectory", 0x1230, 2)
     assert peer_again[0].convert(trajectory, OUTPUT_RESULT, 0) == (0, 0x1230, 0)
