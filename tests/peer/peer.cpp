@@ -16,6 +16,12 @@ using ZarvoSDKClientCPP::SafeString;
 
 PyObject* Address(const void* pointer) { return PyLong_FromVoidPtr(const_cast<void*>(pointer)); }
 
+// Appends `item` (a new reference, or null after a failure) to `list`; on failure releases the list.
+void Append(PyObject*& list, PyObject* item) {
+  if (!item || PyList_Append(list, item) < 0) Py_CLEAR(list);
+  Py_XDECREF(item);
+}
+
 // The descriptor of a mangled name anywhere in the ring; None selects no descriptor at all.
 bool RingType(PyObject* name, TypeInfo** out) {
   *out = nullptr;
@@ -32,18 +38,8 @@ bool RingType(PyObject* name, TypeInfo** out) {
 PyObject* Ring(PyObject*, PyObject*) {
   PyObject* list = PyList_New(0);
   ModuleInfo* head = GetModule();
-  if (!list || !head) return list;
-  ModuleInfo* module = head;
-  do {
-    PyObject* item = Address(module);
-    if (!item || PyList_Append(list, item) < 0) {
-      Py_XDECREF(item);
-      Py_DECREF(list);
-      return nullptr;
-    }
-    Py_DECREF(item);
-    module = module->next;
-  } while (module != head);
+  for (ModuleInfo* module = head; list && module; module = module->next == head ? nullptr : module->next)
+    Append(list, Address(module));
   return list;
 }
 
@@ -54,11 +50,8 @@ PyObject* Casts(PyObject*, PyObject* name) {
   TypeInfo* type;
   if (!RingType(name, &type)) return nullptr;
   PyObject* list = PyList_New(0);
-  for (CastInfo* cast = type ? type->casts : nullptr; list && cast; cast = cast->next) {
-    PyObject* item = PyUnicode_FromString(cast->type->mangledName);
-    if (!item || PyList_Append(list, item) < 0) Py_CLEAR(list);
-    Py_XDECREF(item);
-  }
+  for (CastInfo* cast = type ? type->casts : nullptr; list && cast; cast = cast->next)
+    Append(list, PyUnicode_FromString(cast->type->mangledName));
   return list;
 }
 
@@ -139,12 +132,9 @@ PyObject* Packed(PyObject*, PyObject* args) {
 
 // The mangled names of this module's static descriptor table, in table order.
 PyObject* Names(PyObject*, PyObject*) {
-  PyObject* list = PyList_New(static_cast<Py_ssize_t>(thisModule.size));
-  for (std::size_t i = 0; list && i < thisModule.size; ++i) {
-    PyObject* item = PyUnicode_FromString(thisModule.typeInitial[i]->mangledName);
-    if (!item) Py_CLEAR(list);
-    else PyList_SET_ITEM(list, static_cast<Py_ssize_t>(i), item);
-  }
+  PyObject* list = PyList_New(0);
+  for (std::size_t i = 0; list && i < thisModule.size; ++i)
+    Append(list, PyUnicode_FromString(thisModule.typeInitial[i]->mangledName));
   return list;
 }
 
@@ -176,32 +166,18 @@ PyObject* ErrorTypeOf(PyObject*, PyObject* code) {
   return type;
 }
 
-// Makes the given exception (an instance, or a class raised without a value) pending; None leaves
-// nothing pending.
-void SetPending(PyObject* exception) {
-  if (exception == Py_None) return;
-  if (PyExceptionClass_Check(exception))
-    PyErr_SetNone(exception);
-  else
-    PyErr_SetObject(reinterpret_cast<PyObject*>(Py_TYPE(exception)), exception);
-}
-
-// add_error_msg(pending, message) and raise_or_modify(pending, message): always raise.
-PyObject* AddErrorMsgTo(PyObject*, PyObject* args) {
+// add_error_msg(pending, message) and raise_or_modify(pending, message): make `pending` pending (an
+// instance, or a class raised without a value; None leaves nothing pending), then report; always raise.
+template <void (*Report)(const char*)>
+PyObject* Reporting(PyObject*, PyObject* args) {
   PyObject* pending;
   const char* message;
   if (!PyArg_ParseTuple(args, "Os", &pending, &message)) return nullptr;
-  SetPending(pending);
-  AddErrorMsg(message);
-  return nullptr;
-}
-
-PyObject* RaiseOrModify(PyObject*, PyObject* args) {
-  PyObject* pending;
-  const char* message;
-  if (!PyArg_ParseTuple(args, "Os", &pending, &message)) return nullptr;
-  SetPending(pending);
-  RaiseOrModifyTypeError(message);
+  if (PyExceptionClass_Check(pending))
+    PyErr_SetNone(pending);
+  else if (pending != Py_None)
+    PyErr_SetObject(reinterpret_cast<PyObject*>(Py_TYPE(pending)), pending);
+  Report(message);
   return nullptr;
 }
 
@@ -258,8 +234,8 @@ using Functions = Table<
     Raw<"names", NoArgs, Names>,
     Raw<"unpack", Tuple, Unpack>,
     Raw<"error_type", Object, ErrorTypeOf>,
-    Raw<"add_error_msg", Tuple, AddErrorMsgTo>,
-    Raw<"raise_or_modify", Tuple, RaiseOrModify>,
+    Raw<"add_error_msg", Tuple, Reporting<AddErrorMsg>>,
+    Raw<"raise_or_modify", Tuple, Reporting<RaiseOrModifyTypeError>>,
     Fn<"echo", Object, Received, String>,
     Fn<"library_text", Object, LibraryText, String>,
     Raw<"record", Object, Record>,
@@ -267,8 +243,7 @@ using Functions = Table<
 
 PyMethodDef methods[Functions::defs.size() + 1];
 
-PyModuleDef moduleDef = {PyModuleDef_HEAD_INIT, "_Client3Peer", nullptr, -1, methods,
-                         nullptr,               nullptr,        nullptr, nullptr};
+PyModuleDef moduleDef = {PyModuleDef_HEAD_INIT, "_Client3Peer", nullptr, -1, methods, nullptr, nullptr, nullptr, nullptr};
 
 }  // namespace
 }  // namespace client3
