@@ -21,23 +21,15 @@ def shown(proxy, name):
     return "<Swig Object of type '%s' at %#x>" % (name, id(proxy))
 
 
-@pytest.mark.parametrize(
-    "mangled, name",
-    [
-        (SAFE_STRING, SAFE_STRING_NAME),
-        ("_p_std__vectorT_double_std__allocatorT_double_t_t", "std::vector< double > *"),
-        ("_p_std__vectorT_float_std__allocatorT_float_t_t", "std::vector< float,std::allocator< float > > *"),
-        (
-            "_p_std__vectorT_ZarvoSDKClientCPP__Type_Parameter_std__allocatorT_ZarvoSDKClientCPP__Type_Parameter_t_t",
-            "std::vector< ZarvoSDKClientCPP::Type_Parameter,std::allocator< ZarvoSDKClientCPP::Type_Parameter > > *",
-        ),
-        ("_p_int", "LONG32 *"),
-        ("_p_ZarvoSDKClientCPP__ZarvoPelluxPostClient", "ZarvoSDKClientCPP::ZarvoPelluxPostClient *"),
-        # No readable names: the mangled name is shown.
-        ("_p_ZarvoSDKClientCPP__Output_GetJointDetails", "_p_ZarvoSDKClientCPP__Output_GetJointDetails"),
-        (None, "unknown"),
-    ],
-)
+@pytest.mark.parametrize("mangled, name", [
+    (SAFE_STRING, SAFE_STRING_NAME), ("_p_std__vectorT_double_std__allocatorT_double_t_t", "std::vector< double > *"),
+    ("_p_std__vectorT_float_std__allocatorT_float_t_t", "std::vector< float,std::allocator< float > > *"),
+    ("_p_std__vectorT_ZarvoSDKClientCPP__Type_Parameter_std__allocatorT_ZarvoSDKClientCPP__Type_Parameter_t_t",
+     "std::vector< ZarvoSDKClientCPP::Type_Parameter,std::allocator< ZarvoSDKClientCPP::Type_Parameter > > *"),
+    ("_p_int", "LONG32 *"), ("_p_ZarvoSDKClientCPP__ZarvoPelluxPostClient", "ZarvoSDKClientCPP::ZarvoPelluxPostClient *"),
+    # No readable names: the mangled name is shown.
+    ("_p_ZarvoSDKClientCPP__Output_GetJointDetails", "_p_ZarvoSDKClientCPP__Output_GetJointDetails"), (None, "unknown"),
+])
 def test_repr_shows_the_last_readable_name(peer, mangled, name):
     proxy = peer.make(mangled, 0x1000, NO_SHADOW)
     assert repr(proxy) == shown(proxy, name)
@@ -62,31 +54,20 @@ def test_proxy_type_object():
     assert kind.__name__ == "SwigPyObject"
     assert kind.__doc__ == "Swig object carries a C/C++ instance pointer"
     # (The table's "__repr__" entry is shadowed by the representation slot's own wrapper.)
-    docs = {name: getattr(kind, name).__doc__ for name in ("disown", "acquire", "own", "append", "next")}
-    assert docs == {
-        "disown": "releases ownership of the pointer",
-        "acquire": "acquires ownership of the pointer",
-        "own": "returns/sets ownership of the pointer",
-        "append": "appends another 'this' object",
-        "next": "returns the next 'this' object",
-    }
-    with pytest.raises(TypeError):
-        hash(proxy)
-    with pytest.raises(AttributeError):
-        proxy.anything = 1
-    with pytest.raises(TypeError):
-        kind()
+    assert [getattr(kind, name).__doc__ for name in ("disown", "acquire", "own", "append", "next")] == [
+        "releases ownership of the pointer", "acquires ownership of the pointer", "returns/sets ownership of the pointer",
+        "appends another 'this' object", "returns the next 'this' object"]
+    for call, error in ((lambda: hash(proxy), TypeError), (lambda: setattr(proxy, "anything", 1), AttributeError),
+                        (kind, TypeError)):
+        with pytest.raises(error):
+            call()
 
 
-@pytest.mark.parametrize(
-    "left, right, equal",
-    [
-        ((SAFE_STRING, 0x10), (SAFE_STRING, 0x10), True),
-        ((SAFE_STRING, 0x10), ("_p_int", 0x10), True),  # the descriptors do not take part
-        ((SAFE_STRING, 0x10), (SAFE_STRING, 0x18), False),
-        (("_p_char", 2**64 - 8), ("_p_char", 8), False),
-    ],
-)
+# The descriptors take no part.
+@pytest.mark.parametrize("left, right, equal", [
+    ((SAFE_STRING, 0x10), (SAFE_STRING, 0x10), True), ((SAFE_STRING, 0x10), ("_p_int", 0x10), True),
+    ((SAFE_STRING, 0x10), (SAFE_STRING, 0x18), False), (("_p_char", 2**64 - 8), ("_p_char", 8), False),
+])
 def test_equality_compares_addresses(peer, left, right, equal):
     a = peer.make(left[0], left[1], NO_SHADOW)
     b = peer.make(right[0], right[1], NO_SHADOW)
@@ -108,18 +89,12 @@ def test_int_is_the_native_address(peer, address):
 
 
 # (flags made with, calls as (method, args), results, ownership after)
-@pytest.mark.parametrize(
-    "flags, calls, results, owning",
-    [
-        (OWN, [("own", ())], [True], True),
-        (OWN, [("own", (0,)), ("own", ())], [True, False], False),
-        (0, [("own", (1,)), ("own", ())], [False, True], True),
-        (0, [("own", ("yes",))], [False], True),
-        (OWN, [("own", ([],))], [True], False),
-        (OWN, [("disown", ()), ("own", ())], [None, False], False),
-        (0, [("acquire", ()), ("acquire", ())], [None, None], True),
-    ],
-)
+@pytest.mark.parametrize("flags, calls, results, owning", [
+    (OWN, [("own", ())], [True], True), (OWN, [("own", (0,)), ("own", ())], [True, False], False),
+    (0, [("own", (1,)), ("own", ())], [False, True], True), (0, [("own", ("yes",))], [False], True),
+    (OWN, [("own", ([],))], [True], False), (OWN, [("disown", ()), ("own", ())], [None, False], False),
+    (0, [("acquire", ()), ("acquire", ())], [None, None], True),
+])
 def test_ownership_methods(peer, flags, calls, results, owning):
     proxy = peer.make("_p_int", 0x40, NO_SHADOW | flags)
     try:
@@ -129,25 +104,17 @@ def test_ownership_methods(peer, flags, calls, results, owning):
         proxy.disown()  # the fake address must never reach a destructor
 
 
-def test_own_with_failing_truth_value_sets_ownership_and_keeps_the_error(peer):
-    class Bad:
-        def __bool__(self):
-            raise ZeroDivisionError("no truth")
-
-    proxy = peer.make("_p_int", 0x40, NO_SHADOW)
-    with pytest.raises(SystemError) as raised:
-        proxy.own(Bad())
-    assert isinstance(raised.value.__cause__, ZeroDivisionError)
-    assert proxy.own() is True
-    proxy.disown()
-
-
-def test_own_argument_count():
+def test_own_refusals(peer):
     proxy = _Client3.new_SafeString()
     with pytest.raises(TypeError) as raised:
         proxy.own(1, 2)
-    assert str(raised.value) == "own expected at most 1 arguments, got 2"
-    assert proxy.own() is True
+    assert str(raised.value) == "own expected at most 1 arguments, got 2" and proxy.own() is True
+    # A failing truth value still sets ownership, and its error is kept.
+    proxy = peer.make("_p_int", 0x40, NO_SHADOW)
+    with pytest.raises(SystemError) as raised:
+        proxy.own(type("Bad", (), {"__bool__": lambda self: 1 / 0})())
+    assert isinstance(raised.value.__cause__, ZeroDivisionError) and proxy.own() is True
+    proxy.disown()
 
 
 def test_append_and_next(peer):
@@ -235,52 +202,34 @@ def test_failing_destroy_is_reported_and_the_pending_error_kept(monkeypatch, saf
         assert "SwigPyObject" in str(reports[0].exc_value)
 
 
-@pytest.mark.parametrize(
-    "body, output",
-    [
-        # Owned and never registered: one leak line, and nothing destroyed.
-        ("p = _Client3.new_SafeString(); del p", LEAK.format(SAFE_STRING_NAME)),
-        ("p = _Client3.new_SafeString(); p.disown(); del p", ""),
-        # Registered without a destructor.
-        (
-            "_Client3.SafeString_swigregister(type('S', (), {})); p = _Client3.new_SafeString(); del p",
-            LEAK.format(SAFE_STRING_NAME),
-        ),
-        # Registered with the delete function: destroyed, no line.
-        (
-            "_Client3.SafeString_swigregister(type('S', (), {'__swig_destroy__': _Client3.delete_SafeString}));"
-            "[_Client3.new_SafeString() for i in range(1000)]",
-            "",
-        ),
-        ("p = peer.make('_p_int', 64, 3); del p", LEAK.format("LONG32 *")),
-        ("p = peer.make(None, 64, 3); del p", LEAK.format("unknown")),
-        (
-            "p = peer.make('_p_ZarvoSDKClientCPP__Output_GetTrialName', 64, 3); del p",
-            LEAK.format("_p_ZarvoSDKClientCPP__Output_GetTrialName"),
-        ),
-        # A proxy that acquired ownership later leaks like any other owner.
-        ("p = peer.make('_p_char', 64, 2); p.acquire(); del p", LEAK.format("char *")),
-    ],
-)
+REGISTER = "_Client3.SafeString_swigregister(type('S', (), {%s})); "
+
+
+@pytest.mark.parametrize("body, output", [
+    # Owned and never registered, or registered without a destructor: one leak line, nothing destroyed.
+    ("p = _Client3.new_SafeString(); del p", LEAK.format(SAFE_STRING_NAME)),
+    ("p = _Client3.new_SafeString(); p.disown(); del p", ""),
+    (REGISTER % "" + "p = _Client3.new_SafeString(); del p", LEAK.format(SAFE_STRING_NAME)),
+    # Registered with the delete function: destroyed, no line.
+    (REGISTER % "'__swig_destroy__': _Client3.delete_SafeString" + "[_Client3.new_SafeString() for i in range(1000)]", ""),
+    ("p = peer.make('_p_int', 64, 3); del p", LEAK.format("LONG32 *")),
+    ("p = peer.make(None, 64, 3); del p", LEAK.format("unknown")),
+    ("p = peer.make('_p_ZarvoSDKClientCPP__Output_GetTrialName', 64, 3); del p",
+     LEAK.format("_p_ZarvoSDKClientCPP__Output_GetTrialName")),
+    # A proxy that acquired ownership later leaks like any other owner.
+    ("p = peer.make('_p_char', 64, 2); p.acquire(); del p", LEAK.format("char *")),
+])
 def test_leak_line(peer, body, output):
-    rc, out, err = run_python("import _Client3\n" + build.import_lines(peer.__file__) + body)
-    assert (rc, err) == (0, "")
-    assert out == output
+    assert run_python("import _Client3\n" + build.import_lines(peer.__file__) + body) == (0, output, "")
 
 
 # ---- Packed values ------------------------------------------------------------------------------
 
 
-@pytest.mark.parametrize(
-    "data, hexadecimal",
-    [
-        (b"", ""),
-        (b"\x01\xab\x00\xff", "01ab00ff"),
-        (bytes(range(16)), "000102030405060708090a0b0c0d0e0f"),
-        (b"\x5a" * 511, "5a" * 511),  # 2 * 511 + 2 = 1024 still fits
-        (b"\x5a" * 512, None),
-    ],
-)
+# 2 * 511 + 2 = 1024 characters still fit.
+@pytest.mark.parametrize("data, hexadecimal", [(b"", ""), (b"\x01\xab\x00\xff", "01ab00ff"),
+                                               (bytes(range(16)), "000102030405060708090a0b0c0d0e0f"),
+                                               (b"\x5a" * 511, "5a" * 511), (b"\x5a" * 512, None)])
 def test_packed_representation(peer, data, hexadecimal):
     packed = peer.packed(data, "_p_int")
     assert type(packed).__name__ == "SwigPyPacked"
