@@ -1,6 +1,7 @@
 """The pointer proxy objects: representation, comparison, ownership, chains, destruction and the
 packed values."""
 import operator
+import os
 import sys
 
 import pytest
@@ -218,6 +219,10 @@ REGISTER = "_Client3.SafeString_swigregister(type('S', (), {%s})); "
      LEAK.format("_p_ZarvoSDKClientCPP__Output_GetTrialName")),
     # A proxy that acquired ownership later leaks like any other owner.
     ("p = peer.make('_p_char', 64, 2); p.acquire(); del p", LEAK.format("char *")),
+    # Every class that scripts make and delete (the records among them) has its destructor: no line.
+    ("sys.path.insert(0, %r); import companion; c = companion.register()\n"
+     "for n in [n for n in c if hasattr(_Client3, 'new_' + n) and hasattr(_Client3, 'delete_' + n)] * 3:\n"
+     "    r = c[n](); getattr(_Client3, 'delete_' + n)(getattr(_Client3, 'new_' + n)()); del r" % os.path.dirname(__file__), ""),
 ])
 def test_leak_line(peer, body, output):
     assert run_python("import _Client3\n" + build.import_lines(peer.__file__) + body) == (0, output, "")
