@@ -156,7 +156,8 @@ def test_values_are_copies_and_bits_are_bools():
     assert m.SwigPyIterator___sub__(m.vectorb_end(b), m.vectorb_begin(b)) == 3
 
 
-def test_iterator_outside_the_vector_is_not_read():
+def test_undefined_cases_do_not_crash_the_interpreter():
+    """Positions outside the vector and elements released under an iterator are never read."""
     code = """
 import _Client3 as m
 v = m.new_vectord([1.0, 2.0])
@@ -176,6 +177,19 @@ try:
     raise SystemExit("read a released element")
 except StopIteration:
     pass
+for p in ("vectorb", "vectord", "vectorss"):
+    f = lambda name, *a: getattr(m, p + "_" + name)(*a)
+    v, w = getattr(m, "new_" + p)(), getattr(m, "new_" + p)(1000)
+    f("pop_back", v)
+    it = f("begin", w)
+    f("clear", w)
+    f("reserve", w, 100000)
+    for call in (lambda: f("front", v), lambda: f("back", v), lambda: m.SwigPyIterator_value(f("end", v)),
+                 lambda: m.SwigPyIterator_value(it), lambda: f("insert", v, it, 1)):
+        try:
+            call()
+        except (IndexError, StopIteration, TypeError):
+            pass
 print("ok")
 """
     status, out, err = run_python(code)

@@ -6,12 +6,11 @@ import pytest
 
 import _Client3 as m
 import companion
-from conftest import run_python
 
 
 class Instance:
-    def __init__(self, prefix, element, samples, wrong):
-        self.prefix, self.samples, self.wrong = prefix, samples, wrong  # five distinct elements; one refused
+    def __init__(self, prefix, element, samples, wrong):  # five distinct elements; one refused element
+        self.prefix, self.samples, self.wrong = prefix, samples, wrong
         self.container = f"std::vector< {element} >"
         self.source = f"std::vector< {element},std::allocator< {element} > >"
         self.packed, self.text = element == "bool", prefix == "vectorss"
@@ -93,16 +92,14 @@ def test_sizes_and_pop(inst):
         inst.fn("pop")(v)
     w = inst.make()
     assert [inst.fn(f)(w) for f in ("__len__", "__bool__", "empty")] == [5, True, False]
-    assert inst.value(inst.fn("pop")(w)) == inst.samples[-1]
-    inst.fn("pop_back")(w)
+    assert inst.value(inst.fn("pop")(w)) == inst.samples[-1] and inst.fn("pop_back")(w) is None
     assert inst.read(w) == inst.samples[:3]
     assert (inst.value(inst.fn("front")(w)), inst.value(inst.fn("back")(w))) == (inst.samples[0], inst.samples[2])
     # front and back of an empty vector raise; pop_back of it does nothing.
     for name in ("front", "back"):
         with pytest.raises(IndexError):
             inst.fn(name)(v)
-    inst.fn("pop_back")(v)
-    assert inst.fn("size")(v) == 0
+    assert inst.fn("pop_back")(v) is None and inst.fn("size")(v) == 0
 
 
 @by_instance
@@ -168,16 +165,11 @@ def test_swap_assign_resize_reserve_clear(inst):
 
 
 @by_instance
-@pytest.mark.parametrize(
-    "member, args, position, error, arg_type",
-    [
-        ("reserve", (-1,), 2, OverflowError, "size_type"),
-        ("reserve", (2**32,), 2, OverflowError, "size_type"),
-        ("assign", (1.0, None), 2, TypeError, "size_type"),
-        ("__getslice__", (2**31, 0), 2, OverflowError, "difference_type"),
-        ("__delslice__", (0, 1.5), 3, TypeError, "difference_type"),
-    ],
-)
+@pytest.mark.parametrize("member, args, position, error, arg_type", [
+    ("reserve", (-1,), 2, OverflowError, "size_type"), ("reserve", (2**32,), 2, OverflowError, "size_type"),
+    ("assign", (1.0, None), 2, TypeError, "size_type"), ("__getslice__", (2**31, 0), 2, OverflowError, "difference_type"),
+    ("__delslice__", (0, 1.5), 3, TypeError, "difference_type"),
+])
 def test_index_and_size_arguments(inst, member, args, position, error, arg_type):
     v = inst.make()
     with pytest.raises(error) as info:
@@ -226,7 +218,7 @@ def test_constructors_and_allocator(inst):
     assert len(set(map(repr, inst.read(inst.new(3))))) == 1
     original = inst.make()
     copy = inst.new(original)
-    inst.fn("clear")(original)
+    inst.fn("clear")(original)  # the copy keeps its elements
     assert inst.read(copy) == inst.samples
     assert copy.own() is True and repr(copy).startswith(f"<Swig Object of type '{inst.container[:-2]}")
     allocator = inst.fn("get_allocator")(copy)
@@ -278,26 +270,3 @@ def test_string_elements_keep_their_vector_alive(member):
     assert alive() is None
     popped = m.vectorss_pop(m.new_vectorss(["copy"]))
     assert popped.this.own() is True and not hasattr(popped, "__swig_container")
-
-
-def test_undefined_cases_do_not_crash_the_interpreter():
-    code = """
-import _Client3 as m
-for p in ("vectorb", "vectord", "vectorss"):
-    f = lambda name, *a: getattr(m, p + "_" + name)(*a)
-    v = getattr(m, "new_" + p)()
-    f("pop_back", v)
-    w = getattr(m, "new_" + p)(1000)
-    it = f("begin", w)
-    f("clear", w)
-    f("reserve", w, 100000)
-    for call in (lambda: f("front", v), lambda: f("back", v), lambda: m.SwigPyIterator_value(f("end", v)),
-                 lambda: m.SwigPyIterator_value(it), lambda: f("insert", v, it, 1)):
-        try:
-            call()
-        except (IndexError, StopIteration, TypeError):
-            pass
-print("survived")
-"""
-    status, out, err = run_python(code)
-    assert status == 0 and "survived" in out.splitlines(), err
