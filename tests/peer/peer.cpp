@@ -15,6 +15,10 @@ namespace {
 using ZarvoSDKClientCPP::SafeString;
 
 PyObject* Address(const void* pointer) { return PyLong_FromVoidPtr(const_cast<void*>(pointer)); }
+PyObject* NewRef(PyObject* object) {
+  Py_XINCREF(object);
+  return object;
+}
 
 // Appends `item` (a new reference, or null after a failure) to `list`; on failure releases the list.
 void Append(PyObject*& list, PyObject* item) {
@@ -72,8 +76,7 @@ PyObject* Descriptor(PyObject*, PyObject* name) {
 // The address of the descriptor that an object's proxy carries, or None.
 PyObject* ProxyType(PyObject*, PyObject* object) {
   SwigPyObject* proxy = GetThisProxy(object);
-  if (!proxy) Py_RETURN_NONE;
-  return Address(proxy->type);
+  return proxy ? Address(proxy->type) : NewRef(Py_None);
 }
 
 // make(mangled name or None, address, flags): NewPointerObj.
@@ -84,8 +87,7 @@ PyObject* Make(PyObject*, PyObject* args) {
   TypeInfo* type;
   if (!RingType(name, &type)) return nullptr;
   void* pointer = PyLong_AsVoidPtr(address);
-  if (PyErr_Occurred()) return nullptr;
-  return NewPointerObj(nullptr, pointer, type, flags);
+  return PyErr_Occurred() ? nullptr : NewPointerObj(nullptr, pointer, type, flags);
 }
 
 // convert(object, mangled name or None, flags[, outputs]) -> (code, address or None, own):
@@ -99,25 +101,17 @@ PyObject* Convert(PyObject*, PyObject* args) {
   void* pointer = nullptr;
   int own = 0;
   int code = outputs ? ConvertPtr(object, &pointer, type, flags, &own) : ConvertPtr(object, nullptr, type, flags);
-  if (code < 0) return Py_BuildValue("(iOi)", code, Py_None, own);
-  PyObject* address = pointer ? Address(pointer) : (Py_INCREF(Py_None), Py_None);
-  return Py_BuildValue("(iNi)", code, address, own);
+  return Py_BuildValue("(iNi)", code, code >= 0 && pointer ? Address(pointer) : NewRef(Py_None), own);
 }
 
 // The mangled name TypeQuery finds for a text, or None.
 PyObject* Query(PyObject*, PyObject* text) {
   const char* chars = PyUnicode_AsUTF8(text);
-  if (!chars) return nullptr;
-  TypeInfo* type = TypeQuery(chars);
-  if (!type) Py_RETURN_NONE;
-  return PyUnicode_FromString(type->mangledName);
+  TypeInfo* type = chars ? TypeQuery(chars) : nullptr;
+  return type ? PyUnicode_FromString(type->mangledName) : chars ? NewRef(Py_None) : nullptr;
 }
 
-PyObject* Cache(PyObject*, PyObject*) {
-  PyObject* cache = TypeCache();
-  Py_XINCREF(cache);
-  return cache;
-}
+PyObject* Cache(PyObject*, PyObject*) { return NewRef(TypeCache()); }
 
 // packed(bytes, mangled name): a SwigPyPacked holding a copy of the bytes.
 PyObject* Packed(PyObject*, PyObject* args) {
@@ -150,20 +144,13 @@ PyObject* Unpack(PyObject*, PyObject* args) {
   Py_ssize_t count = UnpackTuple(given == Py_None ? nullptr : given, name, min, max, items);
   if (!count) return nullptr;
   PyObject* list = PyTuple_New(max);
-  for (Py_ssize_t i = 0; list && i < max; ++i) {
-    PyObject* item = items[i] ? items[i] : Py_None;
-    Py_INCREF(item);
-    PyTuple_SET_ITEM(list, i, item);
-  }
+  for (Py_ssize_t i = 0; list && i < max; ++i) PyTuple_SET_ITEM(list, i, NewRef(items[i] ? items[i] : Py_None));
   return list ? Py_BuildValue("(nN)", count, list) : nullptr;
 }
 
 PyObject* ErrorTypeOf(PyObject*, PyObject* code) {
   int value = PyLong_AsLong(code);
-  if (PyErr_Occurred()) return nullptr;
-  PyObject* type = ErrorType(value);
-  Py_INCREF(type);
-  return type;
+  return PyErr_Occurred() ? nullptr : NewRef(ErrorType(value));
 }
 
 // add_error_msg(pending, message) and raise_or_modify(pending, message): make `pending` pending (an
@@ -185,8 +172,7 @@ PyObject* Reporting(PyObject*, PyObject* args) {
 // text is null or empty.
 constexpr auto Received = [](const SafeString& text) -> PyObject* {
   const char* chars = text.Text();
-  if (!chars || !*chars) Py_RETURN_NONE;
-  return PyBytes_FromString(chars);
+  return chars && *chars ? PyBytes_FromString(chars) : NewRef(Py_None);
 };
 
 // A library-made string (owned through the factory) holding the given text, returned by value.
@@ -221,24 +207,13 @@ using ParameterVector =
             "std::vector< ZarvoSDKClientCPP::Type_Parameter,std::allocator< ZarvoSDKClientCPP::Type_Parameter > > &">;
 
 using Functions = Table<
-    Raw<"ring", NoArgs, Ring>,
-    Raw<"own_module", NoArgs, OwnModule>,
-    Raw<"casts", Object, Casts>,
-    Raw<"descriptor", Object, Descriptor>,
-    Raw<"proxy_type", Object, ProxyType>,
-    Raw<"make", Tuple, Make>,
-    Raw<"convert", Tuple, Convert>,
-    Raw<"query", Object, Query>,
-    Raw<"cache", NoArgs, Cache>,
-    Raw<"packed", Tuple, Packed>,
-    Raw<"names", NoArgs, Names>,
-    Raw<"unpack", Tuple, Unpack>,
-    Raw<"error_type", Object, ErrorTypeOf>,
-    Raw<"add_error_msg", Tuple, Reporting<AddErrorMsg>>,
-    Raw<"raise_or_modify", Tuple, Reporting<RaiseOrModifyTypeError>>,
-    Fn<"echo", Object, Received, String>,
-    Fn<"library_text", Object, LibraryText, String>,
-    Raw<"record", Object, Record>,
+    Raw<"ring", NoArgs, Ring>, Raw<"own_module", NoArgs, OwnModule>, Raw<"casts", Object, Casts>,
+    Raw<"descriptor", Object, Descriptor>, Raw<"proxy_type", Object, ProxyType>, Raw<"make", Tuple, Make>,
+    Raw<"convert", Tuple, Convert>, Raw<"query", Object, Query>, Raw<"cache", NoArgs, Cache>,
+    Raw<"packed", Tuple, Packed>, Raw<"names", NoArgs, Names>, Raw<"unpack", Tuple, Unpack>,
+    Raw<"error_type", Object, ErrorTypeOf>, Raw<"add_error_msg", Tuple, Reporting<AddErrorMsg>>,
+    Raw<"raise_or_modify", Tuple, Reporting<RaiseOrModifyTypeError>>, Fn<"echo", Object, Received, String>,
+    Fn<"library_text", Object, LibraryText, String>, Raw<"record", Object, Record>,
     Fn<"push_parameter", Tuple, PushParameter, ParameterVector, String, String>>;
 
 PyMethodDef methods[Functions::defs.size() + 1];
