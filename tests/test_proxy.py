@@ -12,8 +12,7 @@ from conftest import run_python
 from peer import build
 
 SAFE_STRING = "_p_ZarvoSDKClientCPP__SafeString"
-NO_SHADOW = 2
-OWN = 1
+NO_SHADOW, OWN = 2, 1
 SAFE_STRING_NAME = "std::vector< ZarvoSDKClientCPP::SafeString >::value_type *"
 LEAK = "swig/python detected a memory leak of type '{}', no destructor found.\n"
 
@@ -33,27 +32,22 @@ def shown(proxy, name):
 ])
 def test_repr_shows_the_last_readable_name(peer, mangled, name):
     proxy = peer.make(mangled, 0x1000, NO_SHADOW)
-    assert repr(proxy) == shown(proxy, name)
-    assert proxy.__repr__() == repr(proxy)
-    assert str(proxy) == repr(proxy)
+    assert repr(proxy) == shown(proxy, name) == proxy.__repr__() == str(proxy)
 
 
 def test_repr_of_module_made_proxy_and_of_a_chain(peer):
-    first = _Client3.new_SafeString()
-    second = peer.make("_p_int", 0x2000, NO_SHADOW)
-    third = peer.make("_p_char", 0x3000, NO_SHADOW)
-    alone = repr(first)
-    assert alone == shown(first, SAFE_STRING_NAME)
+    first, second, third = (_Client3.new_SafeString(), peer.make("_p_int", 0x2000, NO_SHADOW),
+                            peer.make("_p_char", 0x3000, NO_SHADOW))
+    assert repr(first) == shown(first, SAFE_STRING_NAME)
     second.append(third)
     first.append(second)
-    assert repr(first) == alone + shown(second, "LONG32 *") + shown(third, "char *")
+    assert repr(first) == shown(first, SAFE_STRING_NAME) + shown(second, "LONG32 *") + shown(third, "char *")
 
 
 def test_proxy_type_object():
     proxy = _Client3.new_SafeString()
     kind = type(proxy)
-    assert kind.__name__ == "SwigPyObject"
-    assert kind.__doc__ == "Swig object carries a C/C++ instance pointer"
+    assert (kind.__name__, kind.__doc__) == ("SwigPyObject", "Swig object carries a C/C++ instance pointer")
     # (The table's "__repr__" entry is shadowed by the representation slot's own wrapper.)
     assert [getattr(kind, name).__doc__ for name in ("disown", "acquire", "own", "append", "next")] == [
         "releases ownership of the pointer", "acquires ownership of the pointer", "returns/sets ownership of the pointer",
@@ -119,29 +113,16 @@ def test_own_refusals(peer):
 
 
 def test_append_and_next(peer):
-    proxy = _Client3.new_SafeString()
-    first = peer.make("_p_int", 0x50, NO_SHADOW)
-    second = _Client3.new_SafeString()
+    proxy, first, second = _Client3.new_SafeString(), peer.make("_p_int", 0x50, NO_SHADOW), _Client3.new_SafeString()
     assert proxy.next() is None
-    assert proxy.append(first) is None
-    assert proxy.next() is first
+    assert proxy.append(first) is None and proxy.next() is first
     before = sys.getrefcount(first)
-    assert proxy.append(second) is None
-    assert proxy.next() is second
-    # The replaced link is not released.
-    assert sys.getrefcount(first) == before
-
-
-@pytest.mark.parametrize("other", [5, None, "this", object(), lambda: companion.classes["SafeString"]()])
-def test_append_refuses_non_proxies(other):
-    other = other() if callable(other) else other
-    proxy = _Client3.new_SafeString()
-    kept = _Client3.new_SafeString()
-    proxy.append(kept)
-    with pytest.raises(TypeError) as raised:
-        proxy.append(other)
-    assert str(raised.value) == "Attempt to append a non SwigPyObject"
-    assert proxy.next() is kept
+    assert proxy.append(second) is None and proxy.next() is second
+    assert sys.getrefcount(first) == before  # the replaced link is not released
+    for other in (5, None, "this", object(), companion.classes["SafeString"]()):
+        with pytest.raises(TypeError) as raised:
+            proxy.append(other)
+        assert str(raised.value) == "Attempt to append a non SwigPyObject" and proxy.next() is second
 
 
 # ---- Destruction --------------------------------------------------------------------------------
