@@ -1,9 +1,5 @@
-"""Builds and imports the test-only peer module, a second module of the same family as _Client3.
-
-The peer compiles the runtime sources of this repository together with tests/peer/peer.cpp into
-its own shared object, so it carries its own copy of every runtime static, as any other module of
-the family would.
-"""
+"""Builds and imports the test-only peer module, a second module of the same family as _Client3: it compiles
+the runtime sources with peer.cpp into its own shared object, so it has its own copy of every runtime static."""
 import importlib
 import importlib.machinery
 import os
