@@ -150,23 +150,20 @@ def test_undefined_cases_do_not_crash_the_interpreter():
     """Positions outside the vector and elements released under an iterator are never read."""
     code = """
 import _Client3 as m
+def refused(call, errors=StopIteration):
+    try:
+        call()
+    except errors:
+        return True
 v = m.new_vectord([1.0, 2.0])
 for it, step in ((m.vectord_end(v), 1000), (m.vectord_rend(v), 1), (m.vectord_begin(v), -3)):
     for _ in range(3):
         m.SwigPyIterator_advance(it, step)
-        try:
-            m.SwigPyIterator_value(it)
-            raise SystemExit("read outside the vector")
-        except StopIteration:
-            pass
+        assert refused(lambda: m.SwigPyIterator_value(it)), "read outside the vector"
 closed = m.vectord_iterator(v)
 m.vectord_clear(v)
 m.vectord_reserve(v, 100000)  # the elements it walked are gone
-try:
-    m.SwigPyIterator_value(closed)
-    raise SystemExit("read a released element")
-except StopIteration:
-    pass
+assert refused(lambda: m.SwigPyIterator_value(closed)), "read a released element"
 for p in ("vectorb", "vectord", "vectorss"):
     f = lambda name, *a: getattr(m, p + "_" + name)(*a)
     v, w = getattr(m, "new_" + p)(), getattr(m, "new_" + p)(1000)
@@ -176,11 +173,8 @@ for p in ("vectorb", "vectord", "vectorss"):
     f("reserve", w, 100000)
     for call in (lambda: f("front", v), lambda: f("back", v), lambda: m.SwigPyIterator_value(f("end", v)),
                  lambda: m.SwigPyIterator_value(it), lambda: f("insert", v, it, 1)):
-        try:
-            call()
-        except (IndexError, StopIteration, TypeError):
-            pass
+        refused(call, (IndexError, StopIteration, TypeError))
 print("ok")
 """
-    status, out, err = run_python(code)
+    status, out, err = run_python(code)  # (leak lines for the unregistered classes may come first)
     assert status == 0 and "ok" in out.splitlines(), err
