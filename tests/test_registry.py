@@ -162,30 +162,23 @@ def test_swiginit_stores_or_appends(peer):
     assert _Client3.SafeString_swiginit(instance, second) is None
     assert instance.this is first and first.next() is second
     # Through a "this" chain to the proxy.
-    outer = cls.__new__(cls)
+    outer, third = cls.__new__(cls), _Client3.new_SafeString()
     outer.__dict__["this"] = instance
-    third = _Client3.new_SafeString()
-    assert _Client3.SafeString_swiginit(outer, third) is None
-    assert first.next() is third
+    assert _Client3.SafeString_swiginit(outer, third) is None and first.next() is third
 
 
-def test_swiginit_refused_append_answers_none_with_the_error_pending():
-    cls = companion.classes["SafeString"]
-    instance = cls()
+def test_swiginit_refusals():
+    instance = companion.classes["SafeString"]()
     kept = instance.this
+    for count in (0, 1, 3):
+        with pytest.raises(TypeError) as raised:
+            _Client3.SafeString_swiginit(*[instance, _Client3.new_SafeString(), 1][:count])
+        assert str(raised.value) == "swiginit expected 2 arguments, got %d" % count
+    # A refused append answers None with the error pending.
     with pytest.raises(SystemError) as raised:
         _Client3.SafeString_swiginit(instance, 5)
     assert (type(raised.value.__cause__), str(raised.value.__cause__)) == (TypeError, "Attempt to append a non SwigPyObject")
     assert instance.this is kept and kept.next() is None
-
-
-@pytest.mark.parametrize("count", [0, 1, 3])
-def test_swiginit_argument_count(count):
-    instance = companion.classes["SafeString"]()
-    with pytest.raises(TypeError) as raised:
-        _Client3.SafeString_swiginit(*[instance, _Client3.new_SafeString(), 1][:count])
-    assert str(raised.value) == "swiginit expected 2 arguments, got %d" % count
-    assert instance.this.next() is None
 
 
 # ---- Lookups by name ----------------------------------------------------------------------------
@@ -205,17 +198,15 @@ def test_type_query(peer, text, found):
 
 def test_type_query_cache_is_keyed_by_exact_text(peer):
     capsule_new = ctypes.pythonapi.PyCapsule_New
-    capsule_new.restype = ctypes.py_object
-    capsule_new.argtypes = [ctypes.c_void_p, ctypes.c_char_p, ctypes.c_void_p]
-    cache = peer.cache()
+    capsule_new.restype, capsule_new.argtypes = ctypes.py_object, [ctypes.c_void_p, ctypes.c_char_p, ctypes.c_void_p]
+    cache, found = peer.cache(), "_p_std__vectorT_int_std__allocatorT_int_t_t"
     # A cached answer is taken as it stands, without looking at the ring again.
     cache["std::vector< int > *"] = capsule_new(peer.descriptor("_p_char")[1], None, None)
     try:
-        assert peer.query("std::vector< int > *") == "_p_char"
-        assert peer.query("std::vector<int> *") == "_p_std__vectorT_int_std__allocatorT_int_t_t"
+        assert (peer.query("std::vector< int > *"), peer.query("std::vector<int> *")) == ("_p_char", found)
     finally:
         del cache["std::vector< int > *"]
-    assert peer.query("std::vector< int > *") == "_p_std__vectorT_int_std__allocatorT_int_t_t"
+    assert peer.query("std::vector< int > *") == found
 
 
 # ---- Bad input from other modules and scripts, in a fresh interpreter ------------------------------
@@ -277,24 +268,20 @@ def test_peer_joins_the_ring_after_its_head(peer):
 
 def test_proxies_cross_between_modules(peer):
     mine = _Client3.new_SafeString()
-    theirs = peer.make(SAFE_STRING, int(mine), 2)
+    theirs = peer.make(SAFE_STRING, int(mine), NO_SHADOW)
     assert type(theirs) is not type(mine) and type(theirs).__name__ == type(mine).__name__ == "SwigPyObject"
     assert theirs == mine and _Client3.SafeString_IsEmpty(theirs) is True
     mine.append(theirs)
     assert mine.next() is theirs
     # A registration made through one module is seen by the other.
-    shadowed = peer.make(SAFE_STRING, int(mine), 0)
-    assert type(shadowed) is companion.classes["SafeString"]
+    assert type(peer.make(SAFE_STRING, int(mine), 0)) is companion.classes["SafeString"]
 
 
 def test_initialising_again_relinks_nothing(peer):
     before = snapshot(peer)
     again = initialise_again(_Client3.__file__, "PyInit__Client3")
-    assert again is not _Client3 and again.__name__ == "_Client3"
-    assert [name for name in vars(again) if not name.startswith("__")] == [
-        name for name in vars(_Client3) if not name.startswith("__")
-    ]
-    assert again.ExpectedOneFrame == 1006
+    assert again is not _Client3 and again.__name__ == "_Client3" and again.ExpectedOneFrame == 1006
+    assert [n for n in vars(again) if not n.startswith("__")] == [n for n in vars(_Client3) if not n.startswith("__")]
     peer_again = [initialise_again(peer.__file__, "PyInit__Client3Peer") for _ in range(2)]
     assert all(module is not peer for module in peer_again)
     assert snapshot(peer) == before
@@ -303,8 +290,7 @@ def test_initialising_again_relinks_nothing(peer):
     assert peer_again[0].convert(trajectory, OUTPUT_RESULT, 0) == (0, 0x1230, 0)
     assert peer.casts(OUTPUT_RESULT)[0] == "_p_ZarvoSDKClientCPP__Output_GetTrajectory"
     made = again.new_SafeString()
-    assert _Client3.SafeString_IsEmpty(made) is True
-    assert peer.proxy_type(made) == peer.descriptor(SAFE_STRING)[0]
+    assert _Client3.SafeString_IsEmpty(made) is True and peer.proxy_type(made) == peer.descriptor(SAFE_STRING)[0]
 
 
 # The peer loaded first owns the ring; _Client3 then joins it and uses the peer's descriptors.
@@ -327,7 +313,5 @@ print("ok")
 
 
 def test_module_joins_a_ring_started_by_the_peer(peer):
-    rc, out, err = run_python(
-        build.import_lines(peer.__file__) + PEER_FIRST.format(safe=SAFE_STRING, result=OUTPUT_RESULT)
-    )
-    assert (rc, out, err) == (0, "ok\n", "")
+    script = build.import_lines(peer.__file__) + PEER_FIRST.format(safe=SAFE_STRING, result=OUTPUT_RESULT)
+    assert run_python(script) == (0, "ok\n", "")
