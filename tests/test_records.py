@@ -172,8 +172,7 @@ def test_scalar_fields_round_trip(registered_classes, name, field, kind):
     setter, getter = fn(f"{name}_{field}_set"), fn(f"{name}_{field}_get")
     assert getter(record) == 0 and type(getter(record)) is type(SAMPLE[kind][0])  # new_ zero-fills
     for value in SAMPLE[kind]:
-        assert setter(record, value) is None
-        assert getter(record) == value and type(getter(record)) is type(value)
+        assert setter(record, value) is None and getter(record) == value and type(getter(record)) is type(value)
     # A refused value leaves the field as it was.
     with pytest.raises(TypeError):
         setter(record, "3")
@@ -185,15 +184,12 @@ def test_text_fields_are_borrowed_from_the_record(registered_classes, name, fiel
     record = registered_classes[name]()
     setter, getter = fn(f"{name}_{field}_set"), fn(f"{name}_{field}_get")
     first = getter(record)
-    assert m.SafeString_IsEmpty(first) and m.SafeString_Value(first) == ""
-    assert first.this.own() is False
+    assert m.SafeString_IsEmpty(first) and m.SafeString_Value(first) == "" and first.this.own() is False
     setter(record, text("héllo"))
     again = getter(record)
-    assert m.SafeString_Value(again) == "héllo"
-    assert int(again.this) == int(first.this)  # the same field, not a copy
-    # The field proxy works as a source, including for the field itself.
+    assert m.SafeString_Value(again) == "héllo" and int(again.this) == int(first.this)  # the same field, not a copy
+    # The field proxy works as a source, including for the field itself; refused values change nothing.
     setter(record, again)
-    assert m.SafeString_Value(getter(record)) == "héllo"
     for bad in (None, "text", 3):
         with pytest.raises((TypeError, ValueError)):
             setter(record, bad)
@@ -201,8 +197,8 @@ def test_text_fields_are_borrowed_from_the_record(registered_classes, name, fiel
     # Into another record, the text is copied.
     other = registered_classes["Type_Parameter"]()
     m.Type_Parameter_Value_set(other, again)
-    assert m.SafeString_Value(m.Type_Parameter_Value_get(other)) == "héllo"
-    assert int(m.Type_Parameter_Value_get(other).this) != int(again.this)
+    copied = m.Type_Parameter_Value_get(other)
+    assert m.SafeString_Value(copied) == "héllo" and int(copied.this) != int(again.this)
 
 
 def test_fields_of_one_record_do_not_overlap(registered_classes):
@@ -289,8 +285,7 @@ def test_unsigned_long_long_fields_come_back_exactly(peer):
 
 
 def test_parameter_vectors_move_between_records_as_copies(peer):
-    info = command(peer, "Cmd", "Does it", outputs=[("Frame", "12")])
-    request = library_record(peer, "Output_ProcessRequest")
+    info, request = command(peer, "Cmd", "Does it", outputs=[("Frame", "12")]), library_record(peer, "Output_ProcessRequest")
     source = m.Output_GetCommandInfo_OutputParameters_get(info)
     m.Output_ProcessRequest_OutputParameters_set(request, source)
     copied = m.Output_ProcessRequest_OutputParameters_get(request)
@@ -307,8 +302,6 @@ def test_parameter_vectors_move_between_records_as_copies(peer):
 
 def test_text_fields_of_library_records_are_duplicated_on_assignment(peer):
     record = library_record(peer, "Output_GetTakeInfo")
-    source = peer.library_text("take 1")
-    m.Output_GetTakeInfo_Notes_set(record, source)
-    del source  # the field keeps its own copy
+    m.Output_GetTakeInfo_Notes_set(record, peer.library_text("take 1"))  # the source goes; the field keeps a copy
     assert m.SafeString_Value(m.Output_GetTakeInfo_Notes_get(record)) == "take 1"
     assert m.SafeString_IsEmpty(m.Output_GetTakeInfo_Name_get(record))
