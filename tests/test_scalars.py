@@ -21,19 +21,8 @@ FIELDS = {
 }
 
 
-class Int(int):
-    pass
-
-
-class Float(float):
-    pass
-
-
-class Index:
-    """Usable as an index, but not an integer."""
-
-    def __index__(self):
-        return 1
+Int, Float = type("Int", (int,), {}), type("Float", (float,), {})
+Index = type("Index", (), {"__index__": lambda self: 1})  # usable as an index, but not an integer
 
 
 def f32(value):

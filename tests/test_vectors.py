@@ -15,15 +15,10 @@ class Instance:
         self.source = f"std::vector< {element},std::allocator< {element} > >"
         self.packed, self.text = element == "bool", prefix == "vectorss"
         self.value_type = self.container + ("::value_type" if self.packed else "::value_type const &")
-
-    def __repr__(self):
-        return self.prefix
+        self.new = getattr(m, "new_" + prefix)
 
     def fn(self, name):
         return getattr(m, f"{self.prefix}_{name}")
-
-    def new(self, *args):
-        return getattr(m, "new_" + self.prefix)(*args)
 
     def make(self, items=None):
         return self.new(list(self.samples if items is None else items))
@@ -43,7 +38,7 @@ INSTANCES = [
     Instance("vectorull", "unsigned long long", [0, 2**31 - 1, 2**31, 2**64 - 1, 5], -1),
     Instance("vectorss", "ZarvoSDKClientCPP::SafeString", ["a", "bc", "", "d\u00e9", "e"], 3),
 ]
-by_instance = pytest.mark.parametrize("inst", INSTANCES, ids=repr)
+by_instance = pytest.mark.parametrize("inst", INSTANCES, ids=lambda inst: inst.prefix)
 
 ORDER = ("iterator __nonzero__ __bool__ __len__ __getslice__ __setslice__ __delslice__ __delitem__ __getitem__ "
          "__setitem__ pop append empty size swap begin end rbegin rend clear get_allocator pop_back erase new "
