@@ -61,25 +61,19 @@ def samples():
             type("Holder", (), {{"this": 5}})()]
 problems = []
 for name, function in vars(_Client3).items():
-    if not callable(function) or name.startswith("__") or name.endswith(("_swigregister", "_swiginit")):
-        continue
-    for count in range(4):
-        for index in range(len(samples())):
+    if callable(function) and not name.startswith("__") and not name.endswith(("_swigregister", "_swiginit")):
+        for count, index in [(0, 0)] + [(c, i) for c in (1, 2, 3) for i in range(len(samples()))]:
             args = (samples()[index],) * count
             try:
                 function(*args)
             except SystemError as error:
-                problems.append([name, count, repr(args[0]), str(error)])
+                problems.append([name, repr(args), str(error)])
             except Exception:
                 pass
-            if count == 0:
-                break
 print(json.dumps(problems))
 """
 
 
 def test_bad_input_never_crashes_any_function():
-    tests = os.path.dirname(os.path.abspath(__file__))
-    rc, out, err = run_python(BAD_INPUT_SCRIPT.format(tests=tests))
-    assert rc == 0, err
-    assert json.loads(out.splitlines()[-1]) == []
+    rc, out, err = run_python(BAD_INPUT_SCRIPT.format(tests=os.path.dirname(os.path.abspath(__file__))))
+    assert rc == 0 and json.loads(out.splitlines()[-1]) == [], err
