@@ -31,6 +31,13 @@ def safe_string_class():
     _Client3.SafeString_swigregister(companion.classes["SafeString"])
 
 
+def raises(exception, text, function, *args):
+    """function(*args) must raise `exception` with exactly the message `text`."""
+    with pytest.raises(exception) as caught:
+        function(*args)
+    assert str(caught.value) == text
+
+
 def run_python(code):
     """Runs `code` in a fresh interpreter; returns (exit code, stdout, stderr)."""
     done = subprocess.run([sys.executable, "-c", code], capture_output=True, text=True, timeout=120)

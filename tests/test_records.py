@@ -2,6 +2,7 @@
 import pytest
 
 import _Client3 as m
+from conftest import raises
 
 NS = "ZarvoSDKClientCPP::"
 KINDS = {"i": "int", "u": "unsigned int", "q": "unsigned long long", "b": "bool", "f": "float", "d": "double",
@@ -84,12 +85,6 @@ def family(name, made, fields, methods):
     """The record's functions in table order."""
     return ([f"new_{name}"] * made + [f"delete_{name}"] + [f"{name}_{f}_{a}" for f, _ in fields for a in ("set", "get")]
             + [f"{name}_{method}" for method in methods] + [f"{name}_swigregister"] + [f"{name}_swiginit"] * made)
-
-
-def raises(exception, text, function, *args):
-    with pytest.raises(exception) as caught:
-        function(*args)
-    assert str(caught.value) == text
 
 
 def text(value):

@@ -4,6 +4,7 @@ import pytest
 import _Client3 as m
 import companion
 from test_vectors import INSTANCES, by_instance
+from conftest import raises
 
 
 class Sequence:
@@ -118,9 +119,7 @@ def test_length_is_asked_again_before_every_element():
 def test_element_that_fails_only_in_conversion_is_reported_against_the_argument(source):
     prefix = "vectorss" if isinstance(source, list) else "vectord"
     inst = next(i for i in INSTANCES if i.prefix == prefix)
-    with pytest.raises(TypeError) as info:
-        inst.new(source)
-    assert str(info.value) == f"in method 'new_{prefix}', argument 1 of type '{inst.source} const &'"
+    raises(TypeError, f"in method 'new_{prefix}', argument 1 of type '{inst.source} const &'", inst.new, source)
     v = inst.make()
     with pytest.raises(TypeError) as info:
         inst.fn("__setslice__")(v, 0, 2, Fickle(inst.samples[:3]) if prefix == "vectord" else source)

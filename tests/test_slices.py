@@ -5,6 +5,7 @@ import pytest
 
 import _Client3 as m
 from test_vectors import INSTANCES, by_instance
+from conftest import raises
 
 INDICES = [None, -9, -6, -5, -4, -1, 0, 1, 2, 4, 5, 6, 10, 2**70, -(2**70)]
 STEPS = [None, 1, 2, 3, -1, -2, -4, 2**70]
@@ -80,9 +81,7 @@ def test_read_delete_and_assignment_follow_the_model(inst, n):
             v = inst.make(items)
             expected = model_set(items, start, stop, step, source)
             if isinstance(expected, str):
-                with pytest.raises(ValueError) as info:
-                    inst.fn("__setitem__")(v, s, source)
-                assert str(info.value) == expected
+                raises(ValueError, expected, inst.fn("__setitem__"), v, s, source)
                 assert inst.read(v) == items
             else:
                 inst.fn("__setitem__")(v, s, inst.new(source) if size % 2 else tuple(source))

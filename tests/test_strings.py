@@ -6,6 +6,7 @@ import pytest
 
 import _Client3
 import companion
+from conftest import raises
 
 TEXT_FUNCTIONS = ["SafeString_Value", "SafeString___str__", "SafeString___repr__"]
 
@@ -51,9 +52,7 @@ def test_text_argument(peer, argument, received):
                                       lambda: _Client3.new_SafeString(), lambda: companion.classes["SafeString"]()])
 def test_text_argument_refuses_other_objects(peer, argument):
     argument = argument() if callable(argument) else argument
-    with pytest.raises(TypeError) as raised:
-        peer.echo(argument)
-    assert str(raised.value) == "Expected string type"
+    raises(TypeError, "Expected string type", peer.echo, argument)
 
 
 def test_unencodable_text_leaves_its_error_pending(peer):
@@ -74,9 +73,7 @@ def test_new_safe_string_forms(peer):
     assert isinstance(_Client3.SafeString_Value(made), str)
     # The copy form is never reached from a script: a SafeString is not text.
     for source in (_Client3.new_SafeString(), peer.library_text(b"abc")):
-        with pytest.raises(TypeError) as raised:
-            _Client3.new_SafeString(source)
-        assert str(raised.value) == "Expected string type"
+        raises(TypeError, "Expected string type", _Client3.new_SafeString, source)
     with pytest.raises(ValueError) as raised:
         _Client3.new_SafeString(None)
     assert str(raised.value) == "invalid null reference in method 'new_SafeString', argument 1 of type 'std::string const &'"

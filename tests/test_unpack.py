@@ -2,6 +2,7 @@
 import pytest
 
 import _Client3
+from conftest import raises
 
 OVERLOADS = (
     "Wrong number or type of arguments for overloaded function 'new_SafeString'.\n"
@@ -30,18 +31,14 @@ class Tuple(tuple):
 ])
 def test_unpack(peer, given, low, high, expected):
     if isinstance(expected, str):
-        with pytest.raises(TypeError) as raised:
-            peer.unpack(given, "f", low, high)
-        assert str(raised.value) == expected
+        raises(TypeError, expected, peer.unpack, given, "f", low, high)
     else:
         assert peer.unpack(given, "f", low, high) == expected
 
 
 @pytest.mark.parametrize("low, high", [(2, 2), (0, 0), (2, 3)])
 def test_unpack_bare_object_where_one_is_not_allowed(peer, low, high):
-    with pytest.raises(SystemError) as raised:
-        peer.unpack(5, "f", low, high)
-    assert str(raised.value) == "UnpackTuple() argument list is not a tuple"
+    raises(SystemError, "UnpackTuple() argument list is not a tuple", peer.unpack, 5, "f", low, high)
 
 
 def test_error_type(peer):
@@ -106,13 +103,9 @@ def test_wrong_self_argument(peer, name):
     function = getattr(_Client3, name)
     for bad in (5, "text", b"text", object(), [], type(_Client3.new_SafeString()),
                 peer.make("_p_ZarvoSDKClientCPP__Type_Parameter", 0x10, 2)):
-        with pytest.raises(TypeError) as raised:
-            function(bad)
-        assert str(raised.value) == SELF.format(name)
+        raises(TypeError, SELF.format(name), function, bad)
     # None converts to a null pointer, which is refused rather than used.
-    with pytest.raises(ValueError) as raised:
-        function(None)
-    assert str(raised.value) == "invalid null reference " + SELF.format(name)
+    raises(ValueError, "invalid null reference " + SELF.format(name), function, None)
 
 
 @pytest.mark.parametrize("name", ["SafeString_IsEmpty", "delete_SafeString", "ToString", "SafeString_swigregister"])

@@ -6,6 +6,7 @@ import pytest
 
 import _Client3 as m
 import companion
+from conftest import raises
 
 
 class Instance:
@@ -190,9 +191,7 @@ def test_overload_messages(inst):
     }
     for member, (args, prototypes) in cases.items():
         name = function_name(inst.prefix, member)
-        with pytest.raises(TypeError) as info:
-            getattr(m, name)(*args)
-        assert str(info.value) == overload_text(name, *prototypes)
+        raises(TypeError, overload_text(name, *prototypes), getattr(m, name), *args)
     assert inst.read(v) == inst.samples
     # Self of the wrong type: another instance's vector, a plain object.
     for member, self_, text in (("pop", INSTANCES[(INSTANCES.index(inst) + 1) % 6].make(), "*"), ("empty", 3, "const *")):
