@@ -8,7 +8,7 @@ import pytest
 
 import _Client3
 import companion
-from conftest import run_python
+from conftest import raises, run_python
 from peer import build
 
 SAFE_STRING = "_p_ZarvoSDKClientCPP__SafeString"
@@ -101,9 +101,8 @@ def test_ownership_methods(peer, flags, calls, results, owning):
 
 def test_own_refusals(peer):
     proxy = _Client3.new_SafeString()
-    with pytest.raises(TypeError) as raised:
-        proxy.own(1, 2)
-    assert str(raised.value) == "own expected at most 1 arguments, got 2" and proxy.own() is True
+    raises(TypeError, "own expected at most 1 arguments, got 2", proxy.own, 1, 2)
+    assert proxy.own() is True
     # A failing truth value still sets ownership, and its error is kept.
     proxy = peer.make("_p_int", 0x40, NO_SHADOW)
     with pytest.raises(SystemError) as raised:
@@ -120,9 +119,8 @@ def test_append_and_next(peer):
     assert proxy.append(second) is None and proxy.next() is second
     assert sys.getrefcount(first) == before  # the replaced link is not released
     for other in (5, None, "this", object(), companion.classes["SafeString"]()):
-        with pytest.raises(TypeError) as raised:
-            proxy.append(other)
-        assert str(raised.value) == "Attempt to append a non SwigPyObject" and proxy.next() is second
+        raises(TypeError, "Attempt to append a non SwigPyObject", proxy.append, other)
+        assert proxy.next() is second
 
 
 # ---- Destruction --------------------------------------------------------------------------------
@@ -170,7 +168,7 @@ def test_failing_destroy_is_reported_and_the_pending_error_kept(monkeypatch, saf
     destroy = len if builtin else failing
     _Client3.SafeString_swigregister(type("SafeString", (), {"__swig_destroy__": destroy}))
     # The argument tuple, and with it the owning proxy, is released while the TypeError is pending.
-    with pytest.raises(TypeError) as raised:
+    with pytest.raises(TypeError) as raised:  # (the call must hold the only reference to the proxy)
         _Client3.ToString(_Client3.new_SafeString())
     assert str(raised.value) == "in method 'ToString', argument 1 of type 'ZarvoSDKClientCPP::ResultCode::Enum'"
     assert [(report.object, type(report.exc_value)) for report in reports] == [(destroy, TypeError if builtin else KeyError)]

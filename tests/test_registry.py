@@ -7,7 +7,7 @@ import pytest
 
 import _Client3
 import companion
-from conftest import run_python
+from conftest import raises, run_python
 from peer import build
 
 CAPSULE = "swig_runtime_data4.type_pointer_capsulePelluxPostSDKClientPython3"
@@ -146,9 +146,7 @@ def test_swigregister_with_an_object_that_is_not_a_class(peer, safe_string_class
 @pytest.mark.parametrize("args", [(), (object, object)])
 def test_swigregister_argument_count(peer, args):
     before = type(peer.make(SAFE_STRING, 0x10, 0))
-    with pytest.raises(TypeError) as raised:
-        _Client3.SafeString_swigregister(args)
-    assert str(raised.value) == "swigregister expected 1 arguments, got %d" % len(args)
+    raises(TypeError, "swigregister expected 1 arguments, got %d" % len(args), _Client3.SafeString_swigregister, args)
     assert type(peer.make(SAFE_STRING, 0x10, 0)) is before
 
 
@@ -171,9 +169,8 @@ def test_swiginit_refusals():
     instance = companion.classes["SafeString"]()
     kept = instance.this
     for count in (0, 1, 3):
-        with pytest.raises(TypeError) as raised:
-            _Client3.SafeString_swiginit(*[instance, _Client3.new_SafeString(), 1][:count])
-        assert str(raised.value) == "swiginit expected 2 arguments, got %d" % count
+        raises(TypeError, "swiginit expected 2 arguments, got %d" % count,
+               _Client3.SafeString_swiginit, *[instance, _Client3.new_SafeString(), 1][:count])
     # A refused append answers None with the error pending.
     with pytest.raises(SystemError) as raised:
         _Client3.SafeString_swiginit(instance, 5)

@@ -161,8 +161,6 @@ def test_bad_sequence_in_slice_assignment_changes_nothing():
         with pytest.raises(TypeError) as info:
             m.vectori___setitem__(v, slice(0, 1), source)
         assert "overloaded function 'vectori___setitem__'" in str(info.value)
-    with pytest.raises(ValueError) as info:
-        m.vectori___setitem__(v, slice(0, 1), None)
-    assert str(info.value) == ("invalid null reference in method 'vectori___setitem__', argument 3 of type "
-                               "'std::vector< int,std::allocator< int > > const &'")
+    raises(ValueError, "invalid null reference in method 'vectori___setitem__', argument 3 of type "
+           "'std::vector< int,std::allocator< int > > const &'", m.vectori___setitem__, v, slice(0, 1), None)
     assert [m.vectori___getitem__(v, k) for k in range(3)] == [1, 2, 3]

@@ -21,9 +21,8 @@ def test_default_safe_string_and_delete(peer):
     assert proxy.own() is False and instance.this.own() is False
     assert _Client3.delete_SafeString(None) is None
     for bad in (5, "text", object(), peer.make("_p_ZarvoSDKClientCPP__Type_Parameter", 16, 2)):
-        with pytest.raises(TypeError) as raised:
-            _Client3.delete_SafeString(bad)
-        assert str(raised.value) == "in method 'delete_SafeString', argument 1 of type 'ZarvoSDKClientCPP::SafeString *'"
+        raises(TypeError, "in method 'delete_SafeString', argument 1 of type 'ZarvoSDKClientCPP::SafeString *'",
+               _Client3.delete_SafeString, bad)
 
 
 # Text that is not UTF-8 comes back with lone surrogates, never an error.
@@ -74,9 +73,8 @@ def test_new_safe_string_forms(peer):
     # The copy form is never reached from a script: a SafeString is not text.
     for source in (_Client3.new_SafeString(), peer.library_text(b"abc")):
         raises(TypeError, "Expected string type", _Client3.new_SafeString, source)
-    with pytest.raises(ValueError) as raised:
-        _Client3.new_SafeString(None)
-    assert str(raised.value) == "invalid null reference in method 'new_SafeString', argument 1 of type 'std::string const &'"
+    raises(ValueError, "invalid null reference in method 'new_SafeString', argument 1 of type 'std::string const &'",
+           _Client3.new_SafeString, None)
 
 
 @pytest.mark.parametrize("code, message", [
@@ -94,7 +92,6 @@ def test_to_string(code, message):
 @pytest.mark.parametrize("code, exception", [(2**31, OverflowError), (-(2**31) - 1, OverflowError),
                                              (2**64, OverflowError), ("0", TypeError), (0.0, TypeError), (None, TypeError)])
 def test_to_string_refusals(code, exception):
-    with pytest.raises(exception) as raised:
-        _Client3.ToString(code)
-    assert str(raised.value) == "in method 'ToString', argument 1 of type 'ZarvoSDKClientCPP::ResultCode::Enum'"
+    raises(exception, "in method 'ToString', argument 1 of type 'ZarvoSDKClientCPP::ResultCode::Enum'",
+           _Client3.ToString, code)
 

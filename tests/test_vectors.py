@@ -118,10 +118,8 @@ def test_index_access(inst, index, position):
         del expected[position]
     assert inst.read(v) == expected
     # A bad element is reported against its own argument before the index is looked at.
-    with pytest.raises((TypeError, OverflowError)) as info:
-        set_(v, 99, inst.wrong)
-    assert str(info.value) == ("Expected string type" if inst.text else
-                               f"in method '{inst.prefix}___setitem__', argument 3 of type '{inst.value_type}'")
+    text = "Expected string type" if inst.text else f"in method '{inst.prefix}___setitem__', argument 3 of type '{inst.value_type}'"
+    raises((TypeError, OverflowError), text, set_, v, 99, inst.wrong)
     assert inst.read(v) == expected
 
 
@@ -130,10 +128,8 @@ def test_append(inst):
     for name in ("append", "push_back"):
         v = inst.new()
         assert [inst.fn(name)(v, item) for item in inst.samples] == [None] * 5
-        with pytest.raises((TypeError, OverflowError)) as info:
-            inst.fn(name)(v, inst.wrong)
-        assert str(info.value) == ("Expected string type" if inst.text else
-                                   f"in method '{inst.prefix}_{name}', argument 2 of type '{inst.value_type}'")
+        text = "Expected string type" if inst.text else f"in method '{inst.prefix}_{name}', argument 2 of type '{inst.value_type}'"
+        raises((TypeError, OverflowError), text, inst.fn(name), v, inst.wrong)
         assert inst.read(v) == inst.samples
 
 
@@ -142,9 +138,8 @@ def test_swap_assign_resize_reserve_clear(inst):
     v, w = inst.make(), inst.make(inst.samples[:2])
     inst.fn("swap")(v, w)
     assert (inst.read(v), inst.read(w)) == (inst.samples[:2], inst.samples)
-    with pytest.raises(ValueError) as info:
-        inst.fn("swap")(v, None)
-    assert str(info.value) == f"invalid null reference in method '{inst.prefix}_swap', argument 2 of type '{inst.container} &'"
+    raises(ValueError, f"invalid null reference in method '{inst.prefix}_swap', argument 2 of type '{inst.container} &'",
+           inst.fn("swap"), v, None)
     inst.fn("assign")(v, 3, inst.samples[1])
     inst.fn("resize")(v, 4, inst.samples[0])
     inst.fn("resize")(v, 6)
@@ -167,9 +162,8 @@ def test_swap_assign_resize_reserve_clear(inst):
 ])
 def test_index_and_size_arguments(inst, member, args, position, error, arg_type):
     v = inst.make()
-    with pytest.raises(error) as info:
-        inst.fn(member)(v, *args)
-    assert str(info.value) == f"in method '{inst.prefix}_{member}', argument {position} of type '{inst.container}::{arg_type}'"
+    raises(error, f"in method '{inst.prefix}_{member}', argument {position} of type '{inst.container}::{arg_type}'",
+           inst.fn(member), v, *args)
     assert inst.read(v) == inst.samples
 
 
@@ -195,9 +189,7 @@ def test_overload_messages(inst):
     assert inst.read(v) == inst.samples
     # Self of the wrong type: another instance's vector, a plain object.
     for member, self_, text in (("pop", INSTANCES[(INSTANCES.index(inst) + 1) % 6].make(), "*"), ("empty", 3, "const *")):
-        with pytest.raises(TypeError) as info:
-            inst.fn(member)(self_)
-        assert str(info.value) == f"in method '{inst.prefix}_{member}', argument 1 of type '{c} {text}'"
+        raises(TypeError, f"in method '{inst.prefix}_{member}', argument 1 of type '{c} {text}'", inst.fn(member), self_)
 
 
 @by_instance
@@ -234,9 +226,8 @@ def test_erase_refuses_other_iterators(inst):
     v, w = inst.make(), inst.make()
     other = INSTANCES[(INSTANCES.index(inst) + 1) % 6]
     for wrong in (inst.fn("rbegin")(v), other.fn("begin")(other.make())):
-        with pytest.raises(TypeError) as info:
-            inst.fn("erase")(v, wrong)
-        assert str(info.value) == f"in method '{inst.prefix}_erase', argument 2 of type '{inst.container}::iterator'"
+        raises(TypeError, f"in method '{inst.prefix}_erase', argument 2 of type '{inst.container}::iterator'",
+               inst.fn("erase"), v, wrong)
     # Positions outside this vector are refused rather than followed.
     for outside in (inst.fn("begin")(w), inst.fn("end")(v)):
         with pytest.raises(IndexError):
