@@ -5,7 +5,7 @@ import pytest
 
 import _Client3 as m
 import companion
-from conftest import run_python
+from conftest import raises, run_python
 from test_vectors import by_instance
 
 
@@ -26,8 +26,7 @@ def test_closed_iterator_stays_in_its_range(inst):
     # Steps past either end stop; the steps made before the end stay made.
     for call, args, at in ((m.SwigPyIterator_decr, (), None), (m.SwigPyIterator_incr, (9,), "end"),
                            (m.SwigPyIterator_advance, (-7,), "begin")):
-        with pytest.raises(StopIteration):
-            call(iterator, *args)
+        pytest.raises(StopIteration, call, iterator, *args)
         assert at is None or m.SwigPyIterator_equal(iterator, inst.fn(at)(v)) is True
 
 
@@ -67,8 +66,7 @@ def test_in_place_operators_move_the_object_and_take_ownership():
     assert m.SwigPyIterator_value(again) == 20 and (again.this.own(), result.this.own()) == (True, False)
     closed = m.vectori_iterator(v)
     for n, error in ((7, StopIteration), (2**31, OverflowError)):  # a failed move keeps the ownership
-        with pytest.raises(error):
-            m.SwigPyIterator___iadd__(closed, n)
+        pytest.raises(error, m.SwigPyIterator___iadd__, closed, n)
         assert closed.this.own() is True
 
 
@@ -79,8 +77,7 @@ def test_different_kinds_do_not_relate(left, right):
              (m.vectord_begin(v), m.vectorf_begin(m.new_vectorf()))]
     for a, b in pairs:
         for operator in (m.SwigPyIterator___eq__, m.SwigPyIterator___ne__, m.SwigPyIterator___sub__):
-            with pytest.raises(ValueError, match="^bad iterator type$"):
-                operator(a, b)
+            raises(ValueError, "bad iterator type", operator, a, b)
         for relation in (m.SwigPyIterator_distance, m.SwigPyIterator_equal):  # raise the native exception itself
             with pytest.raises(RuntimeError) as info:
                 relation(a, b)

@@ -54,8 +54,7 @@ def test_proxy_type_object():
         "appends another 'this' object", "returns the next 'this' object"]
     for call, error in ((lambda: hash(proxy), TypeError), (lambda: setattr(proxy, "anything", 1), AttributeError),
                         (kind, TypeError)):
-        with pytest.raises(error):
-            call()
+        pytest.raises(error, call)
 
 
 # The descriptors take no part.
@@ -73,8 +72,7 @@ def test_equality_compares_addresses(peer, left, right, equal):
 
 @pytest.mark.parametrize("compare", [operator.lt, operator.le, operator.gt, operator.ge])
 def test_ordering_is_not_supported(peer, compare):
-    with pytest.raises(TypeError):
-        compare(peer.make("_p_int", 0x10, NO_SHADOW), peer.make("_p_int", 0x20, NO_SHADOW))
+    pytest.raises(TypeError, compare, peer.make("_p_int", 0x10, NO_SHADOW), peer.make("_p_int", 0x20, NO_SHADOW))
 
 
 @pytest.mark.parametrize("address", [1, 0x7FFF0000, 2**63 + 8, 2**64 - 1])

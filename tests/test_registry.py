@@ -103,8 +103,8 @@ def test_this_attributes_and_proxy_chains_are_followed(peer):
 
     broken = type("Broken", (), {"this": property(lambda self: {}["no proxy"])})()
     assert peer.convert(broken, SAFE_STRING, 0)[0] == -1
-    with pytest.raises(TypeError, match="^in method 'SafeString_IsEmpty'"):
-        _Client3.SafeString_IsEmpty(broken)
+    raises(TypeError, "in method 'SafeString_IsEmpty', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'",
+           _Client3.SafeString_IsEmpty, broken)
 
 
 def test_implicit_conversion_builds_the_target_class(peer):

@@ -84,8 +84,7 @@ def test_calling_conventions(inst):
 def test_sizes_and_pop(inst):
     v = inst.new()
     assert [inst.fn(f)(v) for f in ("__len__", "size", "__bool__", "__nonzero__", "empty")] == [0, 0, False, False, True]
-    with pytest.raises(IndexError, match="^pop from empty container$"):
-        inst.fn("pop")(v)
+    raises(IndexError, "pop from empty container", inst.fn("pop"), v)
     w = inst.make()
     assert [inst.fn(f)(w) for f in ("__len__", "__bool__", "empty")] == [5, True, False]
     assert inst.value(inst.fn("pop")(w)) == inst.samples[-1] and inst.fn("pop_back")(w) is None
@@ -93,8 +92,7 @@ def test_sizes_and_pop(inst):
     assert (inst.value(inst.fn("front")(w)), inst.value(inst.fn("back")(w))) == (inst.samples[0], inst.samples[2])
     # front and back of an empty vector raise; pop_back of it does nothing.
     for name in ("front", "back"):
-        with pytest.raises(IndexError):
-            inst.fn(name)(v)
+        pytest.raises(IndexError, inst.fn(name), v)
     assert inst.fn("pop_back")(v) is None and inst.fn("size")(v) == 0
 
 
@@ -105,8 +103,7 @@ def test_index_access(inst, index, position):
     get, set_, delete = inst.fn("__getitem__"), inst.fn("__setitem__"), inst.fn("__delitem__")
     if position is None:
         for call in (lambda: get(v, index), lambda: set_(v, index, inst.samples[0]), lambda: delete(v, index)):
-            with pytest.raises(IndexError, match="^index out of range$"):
-                call()
+            raises(IndexError, "index out of range", call)
     else:
         got = get(v, index)
         assert type(got).__name__ == "SafeString" if inst.text else type(got) is type(inst.samples[0])
@@ -150,8 +147,7 @@ def test_swap_assign_resize_reserve_clear(inst):
     inst.fn("clear")(v)
     assert inst.fn("size")(v) == 0
     if not inst.packed:  # so many elements cannot fit a 32-bit process
-        with pytest.raises(MemoryError):
-            inst.fn("reserve")(v, 2**32 - 1)
+        pytest.raises(MemoryError, inst.fn("reserve"), v, 2**32 - 1)
 
 
 @by_instance
@@ -230,8 +226,7 @@ def test_erase_refuses_other_iterators(inst):
                inst.fn("erase"), v, wrong)
     # Positions outside this vector are refused rather than followed.
     for outside in (inst.fn("begin")(w), inst.fn("end")(v)):
-        with pytest.raises(IndexError):
-            inst.fn("erase")(v, outside)
+        pytest.raises(IndexError, inst.fn("erase"), v, outside)
     assert inst.read(v) == inst.read(w) == inst.samples
 
 
