@@ -103,9 +103,8 @@ def test_operators_answer_not_implemented(operator, other):
     ("advance", "1", TypeError, "in method 'SwigPyIterator_advance', argument 2 of type 'ptrdiff_t'"),
 ])
 def test_argument_messages(name, second, error, text):
-    with pytest.raises(error) as info:
-        getattr(m, "SwigPyIterator_" + name)(*((1.5,) if second == () else (m.vectord_begin(m.new_vectord([1.0])), second)))
-    assert type(info.value) is error and str(info.value) == text
+    args = (1.5,) if second == () else (m.vectord_begin(m.new_vectord([1.0])), second)
+    raises(error, text, getattr(m, "SwigPyIterator_" + name), *args)
 
 
 @pytest.mark.parametrize("name", ["incr", "decr"])
@@ -115,10 +114,9 @@ def test_incr_and_decr_overloads(name, args):
     expected = (f"Wrong number or type of arguments for overloaded function 'SwigPyIterator_{name}'.\n"
                 f"  Possible C/C++ prototypes are:\n    swig::SwigPyIterator::{name}(size_t)\n"
                 f"    swig::SwigPyIterator::{name}()\n")
-    with pytest.raises(TypeError) as info:
-        getattr(m, "SwigPyIterator_" + name)(*((iterator,) + args if args else (3,)))
     count = f"SwigPyIterator_{name} expected at most 2 arguments, got 3\nAdditional information:\n"
-    assert str(info.value) == (count if len(args) == 2 else "") + expected
+    raises(TypeError, (count if len(args) == 2 else "") + expected, getattr(m, "SwigPyIterator_" + name),
+           *((iterator,) + args if args else (3,)))
 
 
 def test_only_the_closed_iterator_keeps_its_vector():

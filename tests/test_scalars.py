@@ -5,6 +5,7 @@ import struct
 import pytest
 
 import _Client3 as m
+from conftest import raises
 
 # One field of each scalar kind: (kind, record, setter and getter stem, declared type text).
 FIELDS = {
@@ -70,10 +71,7 @@ def test_setter_conversion(registered_classes, kind, value, expected):
     record = registered_classes[record_name]() if record_name else None
     before = getter(record) if record is not None else None
     if isinstance(expected, type) and issubclass(expected, Exception):
-        with pytest.raises(expected) as caught:
-            setter(record, value)
-        assert type(caught.value) is expected
-        assert str(caught.value) == f"in method '{stem}_set', argument 2 of type '{type_text}'"
+        raises(expected, f"in method '{stem}_set', argument 2 of type '{type_text}'", setter, record, value)
         if record is not None:
             assert same(getter(record), before)  # the field keeps its value
     else:
