@@ -36,6 +36,7 @@ def raises(exception, text, function, *args):
     with pytest.raises(exception) as caught:
         function(*args)
     assert str(caught.value) == text and (type(caught.value) is exception or isinstance(exception, tuple))
+    return caught.value
 
 
 def run_python(code):

@@ -19,9 +19,7 @@ def test_closed_iterator_stays_in_its_range(inst):
     iterator = inst.fn("iterator")(v)
     assert values(inst, iterator, 5, m.SwigPyIterator___next__) == inst.samples
     for call in (m.SwigPyIterator___next__, m.SwigPyIterator_next, m.SwigPyIterator_value, m.SwigPyIterator___next__):
-        with pytest.raises(StopIteration) as info:
-            call(iterator)
-        assert info.value.value is None
+        assert pytest.raises(StopIteration, call, iterator).value.value is None
     assert values(inst, iterator, 5, m.SwigPyIterator_previous) == inst.samples[::-1]
     # Steps past either end stop; the steps made before the end stay made.
     for call, args, at in ((m.SwigPyIterator_decr, (), None), (m.SwigPyIterator_incr, (9,), "end"),
@@ -79,9 +77,7 @@ def test_different_kinds_do_not_relate(left, right):
         for operator in (m.SwigPyIterator___eq__, m.SwigPyIterator___ne__, m.SwigPyIterator___sub__):
             raises(ValueError, "bad iterator type", operator, a, b)
         for relation in (m.SwigPyIterator_distance, m.SwigPyIterator_equal):  # raise the native exception itself
-            with pytest.raises(RuntimeError) as info:
-                relation(a, b)
-            assert "std::invalid_argument" in repr(info.value.args[0])
+            assert "std::invalid_argument" in repr(pytest.raises(RuntimeError, relation, a, b).value.args[0])
 
 
 @pytest.mark.parametrize("operator", ["__eq__", "__ne__", "__add__", "__sub__"])

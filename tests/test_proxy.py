@@ -103,8 +103,7 @@ def test_own_refusals(peer):
     assert proxy.own() is True
     # A failing truth value still sets ownership, and its error is kept.
     proxy = peer.make("_p_int", 0x40, NO_SHADOW)
-    with pytest.raises(SystemError) as raised:
-        proxy.own(type("Bad", (), {"__bool__": lambda self: 1 / 0})())
+    raised = pytest.raises(SystemError, proxy.own, type("Bad", (), {"__bool__": lambda self: 1 / 0})())
     assert isinstance(raised.value.__cause__, ZeroDivisionError) and proxy.own() is True
     proxy.disown()
 

@@ -172,9 +172,8 @@ def test_swiginit_refusals():
         raises(TypeError, "swiginit expected 2 arguments, got %d" % count,
                _Client3.SafeString_swiginit, *[instance, _Client3.new_SafeString(), 1][:count])
     # A refused append answers None with the error pending.
-    with pytest.raises(SystemError) as raised:
-        _Client3.SafeString_swiginit(instance, 5)
-    assert (type(raised.value.__cause__), str(raised.value.__cause__)) == (TypeError, "Attempt to append a non SwigPyObject")
+    cause = pytest.raises(SystemError, _Client3.SafeString_swiginit, instance, 5).value.__cause__
+    assert (type(cause), str(cause)) == (TypeError, "Attempt to append a non SwigPyObject")
     assert instance.this is kept and kept.next() is None
 
 
@@ -231,9 +230,7 @@ def test_bad_input_from_outside_does_not_crash(peer, script, output):
 
 @pytest.mark.parametrize("instance", [object(), int, 5])
 def test_swiginit_on_an_instance_without_a_dictionary_answers_none_with_the_error_pending(instance):
-    with pytest.raises(SystemError) as raised:
-        _Client3.SafeString_swiginit(instance, _Client3.new_SafeString())
-    assert raised.value.__cause__ is not None
+    assert pytest.raises(SystemError, _Client3.SafeString_swiginit, instance, _Client3.new_SafeString()).value.__cause__
 
 
 # ---- The shared ring: a second module joins it; initialising again relinks nothing -------------

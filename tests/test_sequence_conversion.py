@@ -74,9 +74,7 @@ def test_other_instances_proxy_is_not_read_as_a_sequence(inst):
 
     source = ListLike()
     assert inst.read(inst.new(list(source))) == inst.samples[:1]  # its items would convert
-    with pytest.raises(TypeError) as info:
-        inst.new(source)
-    assert str(info.value).startswith(overload_message("new_" + inst.prefix))
+    assert str(pytest.raises(TypeError, inst.new, source).value).startswith(overload_message("new_" + inst.prefix))
 
 
 @by_instance
@@ -84,13 +82,10 @@ def test_refused_sources_leave_only_the_overload_message(inst):
     """Objects that are no sequence, sequences that fail, and sequences with one refused element."""
     for source in ({1, 2}, {0: 1}, (x for x in ()), 1.5, Failing([1]), BadLength([]),
                    [inst.samples[0], inst.wrong], (inst.wrong,), Sequence([inst.wrong, inst.samples[0]])):
-        with pytest.raises(TypeError) as info:
-            inst.new(source)
-        assert str(info.value).startswith(overload_message("new_" + inst.prefix))
-        assert "Additional information" not in str(info.value)
-    with pytest.raises(ValueError) as info:  # None is a null reference
-        inst.new(None)
-    assert str(info.value) == f"invalid null reference in method 'new_{inst.prefix}', argument 1 of type '{inst.source} const &'"
+        text = str(pytest.raises(TypeError, inst.new, source).value)
+        assert text.startswith(overload_message("new_" + inst.prefix)) and "Additional information" not in text
+    raises(ValueError, f"invalid null reference in method 'new_{inst.prefix}', argument 1 of type '{inst.source} const &'",
+           inst.new, None)  # None is a null reference
 
 
 @pytest.mark.parametrize("prefix, source, expected", [

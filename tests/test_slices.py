@@ -136,9 +136,7 @@ def test_refused_slices_change_nothing(inst, s, error, text):
     v = inst.make()
     for call in (lambda: inst.fn("__getitem__")(v, s), lambda: inst.fn("__setitem__")(v, s, []),
                  lambda: inst.fn("__setitem__")(v, s), lambda: inst.fn("__delitem__")(v, s)):
-        with pytest.raises(error) as info:
-            call()
-        assert text is None or str(info.value) == text
+        assert text in (None, str(pytest.raises(error, call).value))
     assert inst.read(v) == inst.samples
 
 
@@ -158,9 +156,8 @@ def test_slices_copy_their_elements(inst):
 def test_bad_sequence_in_slice_assignment_changes_nothing():
     v = m.new_vectori([1, 2, 3])
     for source in ([1, "x"], [2**31], m.new_vectord([1.0]), 5):
-        with pytest.raises(TypeError) as info:
-            m.vectori___setitem__(v, slice(0, 1), source)
-        assert "overloaded function 'vectori___setitem__'" in str(info.value)
+        refused = pytest.raises(TypeError, m.vectori___setitem__, v, slice(0, 1), source).value
+        assert "overloaded function 'vectori___setitem__'" in str(refused)
     raises(ValueError, "invalid null reference in method 'vectori___setitem__', argument 3 of type "
            "'std::vector< int,std::allocator< int > > const &'", m.vectori___setitem__, v, slice(0, 1), None)
     assert [m.vectori___getitem__(v, k) for k in range(3)] == [1, 2, 3]

@@ -55,7 +55,7 @@ def test_text_argument_refuses_other_objects(peer, argument):
 
 
 def test_unencodable_text_leaves_its_error_pending(peer):
-    with pytest.raises(SystemError) as raised:
+    with pytest.raises(SystemError) as raised:  # (called directly: how the pending error surfaces depends on the caller)
         peer.echo("a\udcff")
     assert type(raised.value.__cause__) is UnicodeEncodeError
 

@@ -60,9 +60,8 @@ class Unprintable(Exception):
     (KeyError("k"), (KeyError, "'k' more")), (IndexError, (IndexError, "more")), (Unprintable(), (Unprintable, "more")),
 ])
 def test_add_error_msg(peer, pending, result):
-    with pytest.raises(Exception) as raised:
-        peer.add_error_msg(pending, "more")
-    assert (type(raised.value), raised.value.args) == (result[0], (result[1],))
+    error = pytest.raises(Exception, peer.add_error_msg, pending, "more").value
+    assert (type(error), error.args) == (result[0], (result[1],))
 
 
 class TypeErrorKind(TypeError):
@@ -74,9 +73,7 @@ class TypeErrorKind(TypeError):
     (TypeErrorKind("sub"), (TypeErrorKind, "sub\nAdditional information:\nmsg")), (ValueError("other"), (TypeError, "msg")),
 ])
 def test_raise_or_modify_type_error(peer, pending, result):
-    with pytest.raises(Exception) as raised:
-        peer.raise_or_modify(pending, "msg")
-    assert (type(raised.value), str(raised.value)) == result
+    raises(*result, peer.raise_or_modify, pending, "msg")
 
 
 # ---- Through the module's own functions ---------------------------------------------------------
@@ -89,10 +86,8 @@ def test_raise_or_modify_type_error(peer, pending, result):
     ((5,), OVERLOADS), ((b"bytes",), OVERLOADS), ((1.5,), OVERLOADS), (("a\udcff",), OVERLOADS),
 ])
 def test_new_safe_string_overload_errors(args, text):
-    with pytest.raises(TypeError) as raised:
-        _Client3.new_SafeString(*args)
-    assert str(raised.value) == text
-    assert raised.value.__cause__ is None and raised.value.__context__ is None
+    error = raises(TypeError, text, _Client3.new_SafeString, *args)
+    assert error.__cause__ is None and error.__context__ is None
 
 
 SELF = "in method '{}', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'"
