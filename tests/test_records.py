@@ -204,9 +204,6 @@ def test_fields_of_one_record_do_not_overlap(registered_classes):
     assert {f: fn(f"Output_ReconstructSettings_{f}_get")(record) for f, _ in fields} == values
 
 
-# ---- Output_Result on every record ------------------------------------------------------------
-
-
 @pytest.mark.parametrize("name,made", [r[:2] for r in RECORDS if r[0] != "Type_Parameter"])
 def test_base_functions_accept_any_record(registered_classes, peer, name, made):
     """Script-made and library-made records alike; every non-zero result is an error."""
@@ -219,18 +216,12 @@ def test_base_functions_accept_any_record(registered_classes, peer, name, made):
     assert m.SafeString_Value(m.Output_Result_ResultString_get(record)) == "why"
 
 
-# ---- Construction and ownership ---------------------------------------------------------------
-
-
 @pytest.mark.parametrize("name", [r[0] for r in CREATABLE])
 def test_new_returns_an_owning_bare_proxy(registered_classes, name):
     bare = fn("new_" + name)()
-    assert type(bare).__name__ == "SwigPyObject" and bare.own() is True
-    assert f"'{NS}{name} *'" in repr(bare)
-    instance = registered_classes[name]()
-    assert instance.this.own() is True
-    assert fn("delete_" + name)(bare) is None
-    assert bare.own() is False  # disowned: its release destroys nothing a second time
+    assert type(bare).__name__ == "SwigPyObject" and bare.own() is True and f"'{NS}{name} *'" in repr(bare)
+    assert registered_classes[name]().this.own() is True
+    assert fn("delete_" + name)(bare) is None and bare.own() is False  # disowned: its release destroys nothing twice
 
 
 # ---- DefaultOutputString ----------------------------------------------------------------------
