@@ -39,6 +39,12 @@ def raises(exception, text, function, *args):
     return caught.value
 
 
+def overload_text(name, *prototypes):
+    """The message of an overloaded function that no overload accepts."""
+    lines = "".join(f"    {p}\n" for p in prototypes)
+    return f"Wrong number or type of arguments for overloaded function '{name}'.\n  Possible C/C++ prototypes are:\n{lines}"
+
+
 def run_python(code):
     """Runs `code` in a fresh interpreter; returns (exit code, stdout, stderr)."""
     done = subprocess.run([sys.executable, "-c", code], capture_output=True, text=True, timeout=120)

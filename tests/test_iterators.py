@@ -5,7 +5,7 @@ import pytest
 
 import _Client3 as m
 import companion
-from conftest import raises, run_python
+from conftest import overload_text, raises, run_python
 from test_vectors import by_instance
 
 
@@ -107,9 +107,7 @@ def test_argument_messages(name, second, error, text):
 @pytest.mark.parametrize("args", [(1, 2), (-1,), ("1",), ()])
 def test_incr_and_decr_overloads(name, args):
     iterator = m.vectord_begin(m.new_vectord([1.0]))
-    expected = (f"Wrong number or type of arguments for overloaded function 'SwigPyIterator_{name}'.\n"
-                f"  Possible C/C++ prototypes are:\n    swig::SwigPyIterator::{name}(size_t)\n"
-                f"    swig::SwigPyIterator::{name}()\n")
+    expected = overload_text(f"SwigPyIterator_{name}", f"swig::SwigPyIterator::{name}(size_t)", f"swig::SwigPyIterator::{name}()")
     count = f"SwigPyIterator_{name} expected at most 2 arguments, got 3\nAdditional information:\n"
     raises(TypeError, (count if len(args) == 2 else "") + expected, getattr(m, "SwigPyIterator_" + name),
            *((iterator,) + args if args else (3,)))

@@ -49,10 +49,6 @@ class BadLength(Sequence):
         raise TypeError("no length")
 
 
-def overload_message(name):
-    return f"Wrong number or type of arguments for overloaded function '{name}'."
-
-
 @by_instance
 def test_any_sequence_of_convertible_elements_and_own_vectors(inst):
     for kind in (list, tuple, Sequence):
@@ -74,7 +70,7 @@ def test_other_instances_proxy_is_not_read_as_a_sequence(inst):
 
     source = ListLike()
     assert inst.read(inst.new(list(source))) == inst.samples[:1]  # its items would convert
-    assert str(pytest.raises(TypeError, inst.new, source).value).startswith(overload_message("new_" + inst.prefix))
+    raises(TypeError, inst.new_refused, inst.new, source)
 
 
 @by_instance
@@ -82,8 +78,7 @@ def test_refused_sources_leave_only_the_overload_message(inst):
     """Objects that are no sequence, sequences that fail, and sequences with one refused element."""
     for source in ({1, 2}, {0: 1}, (x for x in ()), 1.5, Failing([1]), BadLength([]),
                    [inst.samples[0], inst.wrong], (inst.wrong,), Sequence([inst.wrong, inst.samples[0]])):
-        text = str(pytest.raises(TypeError, inst.new, source).value)
-        assert text.startswith(overload_message("new_" + inst.prefix)) and "Additional information" not in text
+        raises(TypeError, inst.new_refused, inst.new, source)
     raises(ValueError, f"invalid null reference in method 'new_{inst.prefix}', argument 1 of type '{inst.source} const &'",
            inst.new, None)  # None is a null reference
 
@@ -100,8 +95,7 @@ def test_elements_follow_the_scalar_rules(prefix, source, expected):
     if expected is not None:
         assert inst.read(inst.new(source)) == expected
     else:
-        with pytest.raises(TypeError, match=overload_message("new_" + prefix)):
-            inst.new(source)
+        raises(TypeError, inst.new_refused, inst.new, source)
 
 
 def test_length_is_asked_again_before_every_element():

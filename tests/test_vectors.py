@@ -6,7 +6,7 @@ import pytest
 
 import _Client3 as m
 import companion
-from conftest import raises
+from conftest import overload_text, raises
 
 
 class Instance:
@@ -17,6 +17,9 @@ class Instance:
         self.packed, self.text = element == "bool", prefix == "vectorss"
         self.value_type = self.container + ("::value_type" if self.packed else "::value_type const &")
         self.new = getattr(m, "new_" + prefix)
+        c, s = self.container, self.container + "::size_type"
+        self.new_refused = overload_text("new_" + prefix, f"{c}::vector()", f"{c}::vector({c} const &)",
+                                         f"{c}::vector({s})", f"{c}::vector({s},{self.value_type})")
 
     def fn(self, name):
         return getattr(m, f"{self.prefix}_{name}")
@@ -51,11 +54,6 @@ OVERLOADED = set("__setslice__ __delitem__ __getitem__ __setitem__ erase resize 
 
 def function_name(prefix, member):
     return f"new_{prefix}" if member == "new" else f"{prefix}_{member}"
-
-
-def overload_text(name, *prototypes):
-    lines = "".join(f"    {p}\n" for p in prototypes)
-    return f"Wrong number or type of arguments for overloaded function '{name}'.\n  Possible C/C++ prototypes are:\n{lines}"
 
 
 def test_table_order():
@@ -176,11 +174,11 @@ def test_overload_messages(inst):
         "erase": ((v, 0), [f"{c}::erase({it})", f"{c}::erase({it},{it})"]),
         "resize": ((v, -1), [f"{c}::resize({s})", f"{c}::resize({s},{vt})"]),
         "insert": ((v, None, 1), [f"{c}::insert({it},{vt})", f"{c}::insert({it},{s},{vt})"]),
-        "new": ((1.5,), [f"{c}::vector()", f"{c}::vector({c} const &)", f"{c}::vector({s})", f"{c}::vector({s},{vt})"]),
     }
     for member, (args, prototypes) in cases.items():
         name = function_name(inst.prefix, member)
         raises(TypeError, overload_text(name, *prototypes), getattr(m, name), *args)
+    raises(TypeError, inst.new_refused, inst.new, 1.5)
     assert inst.read(v) == inst.samples
     # Self of the wrong type: another instance's vector, a plain object.
     for member, self_, text in (("pop", INSTANCES[(INSTANCES.index(inst) + 1) % 6].make(), "*"), ("empty", 3, "const *")):
