@@ -200,11 +200,8 @@ def test_leak_line(peer, body, output):
                                                (b"\x5a" * 511, "5a" * 511), (b"\x5a" * 512, None)])
 def test_packed_representation(peer, data, hexadecimal):
     packed = peer.packed(data, "_p_int")
-    assert type(packed).__name__ == "SwigPyPacked"
-    assert type(packed).__doc__ == "Swig object carries a C/C++ instance pointer"
-    if hexadecimal is None:
-        assert repr(packed) == "<Swig Packed _p_int>"
-        assert str(packed) == "_p_int"
+    assert (type(packed).__name__, type(packed).__doc__) == ("SwigPyPacked", "Swig object carries a C/C++ instance pointer")
+    if hexadecimal is None:  # too long: the name alone
+        assert (repr(packed), str(packed)) == ("<Swig Packed _p_int>", "_p_int")
     else:
-        assert repr(packed) == "<Swig Packed at _%s_p_int>" % hexadecimal
-        assert str(packed) == "_%s_p_int" % hexadecimal
+        assert (repr(packed), str(packed)) == (f"<Swig Packed at _{hexadecimal}_p_int>", f"_{hexadecimal}_p_int")

@@ -49,17 +49,13 @@ def test_cast_lists(peer):
 
 
 def test_conversion_through_a_cast_moves_the_entry_to_the_front(peer):
-    trajectory = peer.make(record("GetTrajectory"), 0x1230, NO_SHADOW)
-    floating = peer.make(record("GetFloat"), 0x4560, NO_SHADOW)
-    assert peer.convert(trajectory, OUTPUT_RESULT, 0) == (0, 0x1230, 0)
-    assert peer.casts(OUTPUT_RESULT)[0] == record("GetTrajectory")
-    assert peer.convert(floating, OUTPUT_RESULT, 0) == (0, 0x4560, 0)
+    for name, address in (("GetTrajectory", 0x1230), ("GetFloat", 0x4560)):
+        assert peer.convert(peer.make(record(name), address, NO_SHADOW), OUTPUT_RESULT, 0) == (0, address, 0)
+        assert peer.casts(OUTPUT_RESULT)[0] == record(name)
     casts = peer.casts(OUTPUT_RESULT)
-    assert casts[:2] == [record("GetFloat"), record("GetTrajectory")]
-    assert len(casts) == len(set(casts)) == 42
+    assert casts[1] == record("GetTrajectory") and len(casts) == len(set(casts)) == 42
     # An exact match does not touch the list.
-    base = peer.make(OUTPUT_RESULT, 0x7890, NO_SHADOW)
-    assert peer.convert(base, OUTPUT_RESULT, 0) == (0, 0x7890, 0)
+    assert peer.convert(peer.make(OUTPUT_RESULT, 0x7890, NO_SHADOW), OUTPUT_RESULT, 0) == (0, 0x7890, 0)
     assert peer.casts(OUTPUT_RESULT) == casts
 
 
@@ -85,22 +81,17 @@ def test_conversion_reports_and_moves_ownership(peer, flags):
     # A refused conversion leaves ownership alone, whatever the flags.
     again = _Client3.new_SafeString()
     assert peer.convert(again, TYPE_PARAMETER, DISOWN)[0] == -1 and again.own() is True
-    borrowed = peer.make(SAFE_STRING, 0x10, NO_SHADOW)
-    assert peer.convert(borrowed, SAFE_STRING, flags) == (0, 0x10, 0)
+    assert peer.convert(peer.make(SAFE_STRING, 0x10, NO_SHADOW), SAFE_STRING, flags) == (0, 0x10, 0)  # borrowed
 
 
 def test_this_attributes_and_proxy_chains_are_followed(peer):
     holder = type("Holder", (), {})
     proxy, inner, outer = _Client3.new_SafeString(), holder(), holder()
     inner.this, outer.this = proxy, inner
-    assert peer.convert(outer, SAFE_STRING, 0)[:2] == (0, int(proxy))
-    assert _Client3.SafeString_IsEmpty(outer) is True
+    assert peer.convert(outer, SAFE_STRING, 0)[:2] == (0, int(proxy)) and _Client3.SafeString_IsEmpty(outer) is True
     # The second proxy of a chain answers for a second type.
-    second = peer.make(TYPE_PARAMETER, 0x3330, NO_SHADOW)
-    proxy.append(second)
-    assert peer.convert(outer, TYPE_PARAMETER, 0)[:2] == (0, 0x3330)
-    assert peer.convert(outer, VECTOR_DOUBLE, 0)[0] == -1
-
+    proxy.append(peer.make(TYPE_PARAMETER, 0x3330, NO_SHADOW))
+    assert peer.convert(outer, TYPE_PARAMETER, 0)[:2] == (0, 0x3330) and peer.convert(outer, VECTOR_DOUBLE, 0)[0] == -1
     broken = type("Broken", (), {"this": property(lambda self: {}["no proxy"])})()
     assert peer.convert(broken, SAFE_STRING, 0)[0] == -1
     raises(TypeError, "in method 'SafeString_IsEmpty', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'",
