@@ -85,8 +85,7 @@ def test_int_is_the_native_address(peer, address):
 def test_ownership_methods(peer, flags, calls, results, owning):
     proxy = peer.make("_p_int", 0x40, NO_SHADOW | flags)
     try:
-        assert [getattr(proxy, name)(*args) for name, args in calls] == results
-        assert proxy.own() is owning
+        assert [getattr(proxy, name)(*args) for name, args in calls] == results and proxy.own() is owning
     finally:
         proxy.disown()  # the fake address must never reach a destructor
 
@@ -104,8 +103,7 @@ def test_own_refusals(peer):
 
 def test_append_and_next(peer):
     proxy, first, second = _Client3.new_SafeString(), peer.make("_p_int", 0x50, NO_SHADOW), _Client3.new_SafeString()
-    assert proxy.next() is None
-    assert proxy.append(first) is None and proxy.next() is first
+    assert proxy.next() is None and proxy.append(first) is None and proxy.next() is first
     before = sys.getrefcount(first)
     assert proxy.append(second) is None and proxy.next() is second
     assert sys.getrefcount(first) == before  # the replaced link is not released

@@ -136,8 +136,7 @@ def test_swiginit_stores_or_appends(peer):
     cls = companion.classes["SafeString"]
     instance = cls.__new__(cls)
     first = _Client3.new_SafeString()
-    assert _Client3.SafeString_swiginit(instance, first) is None
-    assert instance.__dict__ == {"this": first}
+    assert _Client3.SafeString_swiginit(instance, first) is None and instance.__dict__ == {"this": first}
     second = peer.make(TYPE_PARAMETER, 0x6660, NO_SHADOW)
     assert _Client3.SafeString_swiginit(instance, second) is None
     assert instance.this is first and first.next() is second
@@ -259,8 +258,7 @@ def test_initialising_again_relinks_nothing(peer):
     assert again is not _Client3 and again.__name__ == "_Client3" and again.ExpectedOneFrame == 1006
     assert [n for n in vars(again) if not n.startswith("__")] == [n for n in vars(_Client3) if not n.startswith("__")]
     peer_again = [initialise_again(peer.__file__, "PyInit__Client3Peer") for _ in range(2)]
-    assert all(module is not peer for module in peer_again)
-    assert snapshot(peer) == before
+    assert all(module is not peer for module in peer_again) and snapshot(peer) == before
     # Conversions still work, through both modules and the new module objects.
     trajectory = peer.make("_p_ZarvoSDKClientCPP__Output_GetTrajectory", 0x1230, 2)
     assert peer_again[0].convert(trajectory, OUTPUT_RESULT, 0) == (0, 0x1230, 0)

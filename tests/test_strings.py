@@ -18,8 +18,7 @@ def test_default_safe_string_and_delete(peer):
         assert _Client3.SafeString_IsEmpty(made) is True
         assert [getattr(_Client3, name)(made) for name in TEXT_FUNCTIONS] == ["", "", ""]
         assert _Client3.delete_SafeString(made) is None
-    assert proxy.own() is False and instance.this.own() is False
-    assert _Client3.delete_SafeString(None) is None
+    assert proxy.own() is False and instance.this.own() is False and _Client3.delete_SafeString(None) is None
     for bad in (5, "text", object(), peer.make("_p_ZarvoSDKClientCPP__Type_Parameter", 16, 2)):
         raises(TypeError, "in method 'delete_SafeString', argument 1 of type 'ZarvoSDKClientCPP::SafeString *'",
                _Client3.delete_SafeString, bad)

@@ -187,8 +187,7 @@ def test_overload_messages(inst):
 
 @by_instance
 def test_constructors_and_allocator(inst):
-    assert inst.read(inst.new()) == []
-    assert inst.read(inst.new(2, inst.samples[3])) == [inst.samples[3]] * 2
+    assert inst.read(inst.new()) == [] and inst.read(inst.new(2, inst.samples[3])) == [inst.samples[3]] * 2
     assert len(set(map(repr, inst.read(inst.new(3))))) == 1
     original = inst.make()
     copy = inst.new(original)
