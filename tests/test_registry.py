@@ -246,8 +246,7 @@ def test_proxies_cross_between_modules(peer):
     theirs = peer.make(SAFE_STRING, int(mine), NO_SHADOW)
     assert type(theirs) is not type(mine) and type(theirs).__name__ == type(mine).__name__ == "SwigPyObject"
     assert theirs == mine and _Client3.SafeString_IsEmpty(theirs) is True
-    mine.append(theirs)
-    assert mine.next() is theirs
+    assert mine.append(theirs) is None and mine.next() is theirs
     # A registration made through one module is seen by the other.
     assert type(peer.make(SAFE_STRING, int(mine), 0)) is companion.classes["SafeString"]
 
