@@ -281,9 +281,9 @@ def test_parameter_vectors_move_between_records_as_copies(peer):
     assert not copied.own() and copied != source
     # The copy is independent: growing the source leaves it as it was.
     peer.push_parameter(source, "Subject", "x")
-    m.Output_GetCommandInfo_InputParameters_set(info, copied)
-    assert m.Output_GetCommandInfo_DefaultOutputString(info).count("Frame") == 2
-    assert "Subject   x" in m.Output_GetCommandInfo_DefaultOutputString(info)
+    assert m.Output_GetCommandInfo_InputParameters_set(info, copied) is None
+    shown = m.Output_GetCommandInfo_DefaultOutputString(info)
+    assert shown.count("Frame") == 2 and "Subject   x" in shown
     # A field assigned to itself is left as it is.
     m.Output_GetCommandInfo_InputParameters_set(info, m.Output_GetCommandInfo_InputParameters_get(info))
     assert m.Output_GetCommandInfo_DefaultOutputString(info).count("Frame") == 2

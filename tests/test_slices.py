@@ -89,18 +89,15 @@ def test_read_delete_and_assignment_follow_the_model(inst, n):
 
 @by_instance
 def test_two_index_forms_follow_the_model(inst):
-    items = inst.samples
-    source = inst.samples[1:4]
+    items, source = inst.samples, inst.samples[1:4]
     for i, j in itertools.product(range(-7, 8), repeat=2):
-        v = inst.make()
-        assert inst.read(inst.fn("__getslice__")(v, i, j)) == model_get(items, i, j, 1)
-        assert inst.fn("__setslice__")(v, i, j, source) is None and inst.read(v) == model_set(items, i, j, 1, source)
-        v = inst.make()
-        assert inst.fn("__setslice__")(v, i, j) is None and inst.read(v) == model_set(items, i, j, 1, [])
-        v = inst.make()
-        inst.fn("__delslice__")(v, i, j)
+        assert inst.read(inst.fn("__getslice__")(inst.make(), i, j)) == model_get(items, i, j, 1)
         ii, jj = min(max(i, 0), 5), min(max(j, 0), 5)
-        assert inst.read(v) == items[:ii] + items[max(ii, jj):]
+        for function, rest, expected in (("__setslice__", (source,), model_set(items, i, j, 1, source)),
+                                         ("__setslice__", (), model_set(items, i, j, 1, [])),
+                                         ("__delslice__", (), items[:ii] + items[max(ii, jj):])):
+            v = inst.make()
+            assert inst.fn(function)(v, i, j, *rest) is None and inst.read(v) == expected, (function, i, j)
 
 
 # Worked examples on [0, 1, 2, 3, 4], independent of the model: a read starting past the end starts at
