@@ -20,7 +20,7 @@ def registered_classes():
 def peer(tmp_path_factory):
     """A second module of the family, built for the tests, that looks inside the runtime and makes
     objects the way the library does."""
-    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
+    return build.peer(tmp_path_factory.mktemp("peer"))
 
 
 @pytest.fixture

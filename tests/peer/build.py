@@ -12,7 +12,6 @@ ROOT = os.path.dirname(os.path.dirname(HERE))
 NAME = "_Client3Peer"
 SOURCES = ["runtime/proxy.cpp", "runtime/registry.cpp", "runtime/errors.cpp", "runtime/types.cpp",
            "library/StringFactory.cpp"]
-_peer = None
 
 
 def import_lines(path):
@@ -20,22 +19,17 @@ def import_lines(path):
     return "import sys\nsys.path.insert(0, %r)\nimport %s as peer\n" % (os.path.dirname(path), NAME)
 
 
-def peer(directory_factory):
-    """The peer module, built into `directory_factory()` and imported (joining the shared type ring)
-    once per process."""
-    global _peer
-    if _peer is None:
-        directory = str(directory_factory())
-        target = os.path.join(directory, NAME + importlib.machinery.EXTENSION_SUFFIXES[0])
-        command = [
-            os.environ.get("CXX", "g++"), "-std=c++20", "-O1", "-fPIC", "-shared", "-fvisibility=hidden",
-            "-fvisibility-inlines-hidden", "-Wall", "-Wextra", "-I", sysconfig.get_paths()["include"], "-I", ROOT,
-            "-I", os.path.join(ROOT, "include"), *[os.path.join(ROOT, s) for s in SOURCES],
-            os.path.join(HERE, "peer.cpp"), "-o", target,
-        ]
-        done = subprocess.run(command, capture_output=True, text=True)
-        if done.returncode != 0:
-            raise RuntimeError("building the peer module failed:\n" + done.stderr)
-        sys.path.insert(0, directory)
-        _peer = importlib.import_module(NAME)
-    return _peer
+def peer(directory):
+    """Builds the peer module into `directory` and imports it (it joins the shared type ring)."""
+    target = os.path.join(str(directory), NAME + importlib.machinery.EXTENSION_SUFFIXES[0])
+    command = [
+        os.environ.get("CXX", "g++"), "-std=c++20", "-O1", "-fPIC", "-shared", "-fvisibility=hidden",
+        "-fvisibility-inlines-hidden", "-Wall", "-Wextra", "-I", sysconfig.get_paths()["include"], "-I", ROOT,
+        "-I", os.path.join(ROOT, "include"), *[os.path.join(ROOT, s) for s in SOURCES],
+        os.path.join(HERE, "peer.cpp"), "-o", target,
+    ]
+    done = subprocess.run(command, capture_output=True, text=True)
+    if done.returncode != 0:
+        raise RuntimeError("building the peer module failed:\n" + done.stderr)
+    sys.path.insert(0, str(directory))
+    return importlib.import_module(NAME)
