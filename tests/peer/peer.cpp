@@ -1,7 +1,6 @@
-// A second module of the family, built only for the test suite. It compiles the same runtime and the
-// same descriptor table as _Client3, joins the shared type ring at import, and offers functions that
-// look inside its copy of the runtime: the ring, descriptors and cast lists, pointer conversion in
-// both directions, the type cache, packed values, and the text conversions.
+// A second module of the family, built only for the test suite: the same runtime and descriptor table as
+// _Client3, joining the shared type ring at import, with functions that look inside its copy of the runtime
+// (ring, descriptors, cast lists, pointer conversion both ways, type cache, packed values, text conversion).
 #include <cstring>
 
 #include "convert/text.h"
@@ -15,10 +14,7 @@ namespace {
 using ZarvoSDKClientCPP::SafeString;
 
 PyObject* Address(const void* pointer) { return PyLong_FromVoidPtr(const_cast<void*>(pointer)); }
-PyObject* NewRef(PyObject* object) {
-  Py_XINCREF(object);
-  return object;
-}
+PyObject* NewRef(PyObject* object) { return Py_XINCREF(object), object; }
 
 // Appends `item` (a new reference, or null after a failure) to `list`; on failure releases the list.
 void Append(PyObject*& list, PyObject* item) {
