@@ -130,19 +130,15 @@ def test_append(inst):
 @by_instance
 def test_swap_assign_resize_reserve_clear(inst):
     v, w = inst.make(), inst.make(inst.samples[:2])
-    inst.fn("swap")(v, w)
-    assert (inst.read(v), inst.read(w)) == (inst.samples[:2], inst.samples)
+    assert inst.fn("swap")(v, w) is None and (inst.read(v), inst.read(w)) == (inst.samples[:2], inst.samples)
     raises(ValueError, f"invalid null reference in method '{inst.prefix}_swap', argument 2 of type '{inst.container} &'",
            inst.fn("swap"), v, None)
-    inst.fn("assign")(v, 3, inst.samples[1])
-    inst.fn("resize")(v, 4, inst.samples[0])
-    inst.fn("resize")(v, 6)
+    assert [inst.fn(f)(v, *args) for f, args in (("assign", (3, inst.samples[1])), ("resize", (4, inst.samples[0])),
+                                                  ("resize", (6,)))] == [None] * 3
     default = {"vectorb": False, "vectorss": ""}.get(inst.prefix, 0)
     assert inst.read(v) == [inst.samples[1]] * 3 + [inst.samples[0], default, default]
-    inst.fn("reserve")(v, 100)
-    assert inst.fn("capacity")(v) >= 100
-    inst.fn("clear")(v)
-    assert inst.fn("size")(v) == 0
+    assert inst.fn("reserve")(v, 100) is None and inst.fn("capacity")(v) >= 100
+    assert inst.fn("clear")(v) is None and inst.fn("size")(v) == 0
     if not inst.packed:  # so many elements cannot fit a 32-bit process
         pytest.raises(MemoryError, inst.fn("reserve"), v, 2**32 - 1)
 
@@ -191,8 +187,7 @@ def test_constructors_and_allocator(inst):
     assert len(set(map(repr, inst.read(inst.new(3))))) == 1
     original = inst.make()
     copy = inst.new(original)
-    inst.fn("clear")(original)  # the copy keeps its elements
-    assert inst.read(copy) == inst.samples
+    assert inst.fn("clear")(original) is None and inst.read(copy) == inst.samples  # the copy keeps its elements
     assert copy.own() is True and repr(copy).startswith(f"<Swig Object of type '{inst.container[:-2]}")
     allocator = inst.fn("get_allocator")(copy)
     assert allocator.own() is True and f"std::allocator< {inst.container[13:-2]} > *" in repr(allocator)
