@@ -100,10 +100,8 @@ def library_record(peer, name):
 
 
 def test_record_functions_are_listed_in_table_order():
-    listed = [key for key, value in vars(m).items() if callable(value)]
-    expected = [n for record in RECORDS for n in family(*record)]
-    start = listed.index("new_Type_Parameter")
-    assert listed[start:start + len(expected)] == expected
+    listed, expected = [key for key, value in vars(m).items() if callable(value)], [n for r in RECORDS for n in family(*r)]
+    assert listed[listed.index("new_Type_Parameter"):][:len(expected)] == expected
 
 
 @pytest.mark.parametrize("record", RECORDS, ids=[r[0] for r in RECORDS])
@@ -233,9 +231,8 @@ def command(peer, name, description, inputs=(), outputs=()):
         m.Output_GetCommandInfo_Name_set(record, peer.library_text(name))
         m.Output_GetCommandInfo_Description_set(record, peer.library_text(description))
     for field, parameters in (("InputParameters", inputs), ("OutputParameters", outputs)):
-        vector = getattr(m, "Output_GetCommandInfo_%s_get" % field)(record)
         for parameter in parameters:
-            peer.push_parameter(vector, *parameter)
+            peer.push_parameter(getattr(m, f"Output_GetCommandInfo_{field}_get")(record), *parameter)
     return record
 
 
