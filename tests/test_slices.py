@@ -4,7 +4,7 @@ import itertools
 import pytest
 
 import _Client3 as m
-from test_vectors import INSTANCES, by_instance
+from test_vectors import by_instance
 from conftest import raises
 
 INDICES = [None, -9, -6, -5, -4, -1, 0, 1, 2, 4, 5, 6, 10, 2**70, -(2**70)]
