@@ -27,8 +27,7 @@ def peer(tmp_path_factory):
 def safe_string_class():
     """Lets a test register its own class for SafeString; the companion class is put back after."""
     yield
-    import _Client3
-    _Client3.SafeString_swigregister(companion.classes["SafeString"])
+    companion._Client3.SafeString_swigregister(companion.classes["SafeString"])
 
 
 def raises(exception, text, function, *args):

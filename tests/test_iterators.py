@@ -9,18 +9,14 @@ from conftest import overload_text, raises, run_python
 from test_vectors import by_instance
 
 
-def values(inst, iterator, steps, step=m.SwigPyIterator_next):
-    return [inst.value(step(iterator)) for _ in range(steps)]
-
-
 @by_instance
 def test_closed_iterator_stays_in_its_range(inst):
     v = inst.make()
     iterator = inst.fn("iterator")(v)
-    assert values(inst, iterator, 5, m.SwigPyIterator___next__) == inst.samples
+    assert [inst.value(m.SwigPyIterator___next__(iterator)) for _ in range(5)] == inst.samples
     for call in (m.SwigPyIterator___next__, m.SwigPyIterator_next, m.SwigPyIterator_value, m.SwigPyIterator___next__):
         assert pytest.raises(StopIteration, call, iterator).value.value is None
-    assert values(inst, iterator, 5, m.SwigPyIterator_previous) == inst.samples[::-1]
+    assert [inst.value(m.SwigPyIterator_previous(iterator)) for _ in range(5)] == inst.samples[::-1]
     # Steps past either end stop; the steps made before the end stay made.
     for call, args, at in ((m.SwigPyIterator_decr, (), None), (m.SwigPyIterator_incr, (9,), "end"),
                            (m.SwigPyIterator_advance, (-7,), "begin")):

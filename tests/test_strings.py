@@ -15,8 +15,7 @@ def test_default_safe_string_and_delete(peer):
     proxy, instance = _Client3.new_SafeString(), companion.classes["SafeString"]()
     assert type(proxy).__name__ == "SwigPyObject" and proxy.own() is True and instance.this.own() is True
     for made in (proxy, instance):
-        assert _Client3.SafeString_IsEmpty(made) is True
-        assert [getattr(_Client3, name)(made) for name in TEXT_FUNCTIONS] == ["", "", ""]
+        assert _Client3.SafeString_IsEmpty(made) is True and [getattr(_Client3, n)(made) for n in TEXT_FUNCTIONS] == [""] * 3
         assert _Client3.delete_SafeString(made) is None
     assert proxy.own() is False and instance.this.own() is False and _Client3.delete_SafeString(None) is None
     for bad in (5, "text", object(), peer.make("_p_ZarvoSDKClientCPP__Type_Parameter", 16, 2)):
