@@ -137,13 +137,13 @@ def test_refused_slices_change_nothing(inst, s, error, text):
 @by_instance
 def test_slices_copy_their_elements(inst):
     v = inst.make()
-    inst.fn("__setitem__")(v, slice(1, 2), v)  # a vector assigned into itself
+    assert inst.fn("__setitem__")(v, slice(1, 2), v) is None  # a vector assigned into itself
     assert inst.read(v) == inst.samples[:1] + inst.samples + inst.samples[2:]
     w = inst.make()
     assert inst.fn("__setitem__")(w, slice(None, None, -1), w) is None and inst.read(w) == inst.samples[::-1]
     part = inst.fn("__getitem__")(w, slice(0, 2))
-    inst.fn("__setitem__")(w, 0, inst.samples[1])
-    assert inst.read(part) == inst.samples[:-3:-1] and part.this.own() is True
+    assert inst.fn("__setitem__")(w, 0, inst.samples[1]) is None and inst.read(part) == inst.samples[:-3:-1]
+    assert part.this.own() is True
 
 
 def test_bad_sequence_in_slice_assignment_changes_nothing():

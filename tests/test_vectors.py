@@ -217,8 +217,7 @@ def test_erase_and_insert_with_iterators(inst):
 
 @pytest.mark.parametrize("member", ["__getitem__", "front", "back"])
 def test_string_elements_keep_their_vector_alive(member):
-    vector = companion.classes["vectorss"]()
-    m.vectorss_append(vector, "kept")
+    vector = companion.classes["vectorss"](["kept"])
     element = getattr(m, "vectorss_" + member)(*((vector, 0) if member == "__getitem__" else (vector,)))
     assert element.__swig_container is vector and element.this.own() is False
     alive = weakref.ref(vector)
