@@ -156,10 +156,8 @@ PyObject* Reporting(PyObject*, PyObject* args) {
   PyObject* pending;
   const char* message;
   if (!PyArg_ParseTuple(args, "Os", &pending, &message)) return nullptr;
-  if (PyExceptionClass_Check(pending))
-    PyErr_SetNone(pending);
-  else if (pending != Py_None)
-    PyErr_SetObject(reinterpret_cast<PyObject*>(Py_TYPE(pending)), pending);
+  if (PyExceptionClass_Check(pending)) PyErr_SetNone(pending);
+  else if (pending != Py_None) PyErr_SetObject(reinterpret_cast<PyObject*>(Py_TYPE(pending)), pending);
   Report(message);
   return nullptr;
 }
