@@ -13,9 +13,8 @@ CONSTANTS = [("Success", 0), ("UnknownStatus", 1), ("NotConnected", 1000), ("Req
 # The families by the class part of a function name, in the order the module lists them.
 FAMILIES = [{"SwigPyIterator"}, {"vectorb"}, {"vectord"}, {"vectorf"}, {"vectori"}, {"vectorull"}, {"vectorss"},
             {"SafeString", "ToString"}, {"Type", "Output"}, {"ZarvoPelluxPostClient"}]
-SAFE_STRING_FAMILY = ["new_SafeString", "delete_SafeString", "SafeString_IsEmpty", "SafeString_Value",
-                      "SafeString___str__", "SafeString___repr__", "SafeString_swigregister", "SafeString_swiginit",
-                      "ToString"]
+SAFE_STRING_FAMILY = ["new_SafeString", "delete_SafeString"] + [f"SafeString_{member}" for member in (
+    "IsEmpty", "Value", "__str__", "__repr__", "swigregister", "swiginit")] + ["ToString"]
 
 
 def family_of(name):

@@ -27,12 +27,9 @@ def triple(s, n):
 def adjust(i, j, step, n, insert):
     if step > 0:
         ii = 0 if i < 0 else i if i < n else (n if insert else 0)
-        jj = max(ii, 0 if j < 0 else min(j, n))
-    else:
-        ii = -1 if i < -1 else i if i < n else n - 1
-        jj = -1 if j < -1 else j if j < n else n - 1
-        ii = max(ii, jj)
-    return ii, jj
+        return ii, max(ii, 0 if j < 0 else min(j, n))
+    jj = -1 if j < -1 else j if j < n else n - 1
+    return max(jj, -1 if i < -1 else i if i < n else n - 1), jj
 
 
 def positions(i, j, step, n, insert):
