@@ -134,12 +134,9 @@ def test_swigregister_argument_count(peer, args):
 
 def test_swiginit_stores_or_appends(peer):
     cls = companion.classes["SafeString"]
-    instance = cls.__new__(cls)
-    first = _Client3.new_SafeString()
+    instance, first, second = cls.__new__(cls), _Client3.new_SafeString(), peer.make(TYPE_PARAMETER, 0x6660, NO_SHADOW)
     assert _Client3.SafeString_swiginit(instance, first) is None and instance.__dict__ == {"this": first}
-    second = peer.make(TYPE_PARAMETER, 0x6660, NO_SHADOW)
-    assert _Client3.SafeString_swiginit(instance, second) is None
-    assert instance.this is first and first.next() is second
+    assert _Client3.SafeString_swiginit(instance, second) is None and instance.this is first and first.next() is second
     # Through a "this" chain to the proxy.
     outer, third = cls.__new__(cls), _Client3.new_SafeString()
     outer.__dict__["this"] = instance
