@@ -112,8 +112,7 @@ def test_only_the_closed_iterator_keeps_its_vector():
     vector = companion.classes["vectord"]()
     before = sys.getrefcount(vector)
     iterator = m.vectord_iterator(vector)
-    copy = m.SwigPyIterator_copy(iterator)
-    open_iterator = m.vectord_begin(vector)
+    copy, open_iterator = m.SwigPyIterator_copy(iterator), m.vectord_begin(vector)
     assert sys.getrefcount(vector) == before + 2
     assert m.delete_SwigPyIterator(iterator) is None and m.delete_SwigPyIterator(None) is None
     del copy, open_iterator

@@ -139,8 +139,8 @@ def test_slices_copy_their_elements(inst):
     w = inst.make()
     assert inst.fn("__setitem__")(w, slice(None, None, -1), w) is None and inst.read(w) == inst.samples[::-1]
     part = inst.fn("__getitem__")(w, slice(0, 2))
-    assert inst.fn("__setitem__")(w, 0, inst.samples[1]) is None and inst.read(part) == inst.samples[:-3:-1]
-    assert part.this.own() is True
+    assert inst.fn("__setitem__")(w, 0, inst.samples[1]) is None
+    assert inst.read(part) == inst.samples[:-3:-1] and part.this.own() is True
 
 
 def test_bad_sequence_in_slice_assignment_changes_nothing():
