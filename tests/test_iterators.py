@@ -122,8 +122,7 @@ def test_only_the_closed_iterator_keeps_its_vector():
 def test_values_are_copies_and_bits_are_bools():
     v = m.new_vectorss(["one", "two"])
     first = m.SwigPyIterator_next(m.vectorss_iterator(v))
-    assert m.vectorss___setitem__(v, 0, "changed") is None and m.SafeString_Value(first) == "one"
-    assert first.this.own() is True
+    assert m.vectorss___setitem__(v, 0, "changed") is None and m.SafeString_Value(first) == "one" and first.this.own() is True
     b = m.new_vectorb([True, False, True])
     assert [m.SwigPyIterator_next(it) for it in [m.vectorb_rbegin(b)] for _ in range(3)] == [True, False, True]
     assert m.SwigPyIterator___sub__(m.vectorb_end(b), m.vectorb_begin(b)) == 3

@@ -38,8 +38,7 @@ def test_repr_shows_the_last_readable_name(peer, mangled, name):
 def test_repr_of_module_made_proxy_and_of_a_chain(peer):
     first, second, third = (_Client3.new_SafeString(), peer.make("_p_int", 0x2000, NO_SHADOW),
                             peer.make("_p_char", 0x3000, NO_SHADOW))
-    assert repr(first) == shown(first, SAFE_STRING_NAME)
-    assert second.append(third) is None and first.append(second) is None
+    assert repr(first) == shown(first, SAFE_STRING_NAME) and second.append(third) is None and first.append(second) is None
     assert repr(first) == shown(first, SAFE_STRING_NAME) + shown(second, "LONG32 *") + shown(third, "char *")
 
 

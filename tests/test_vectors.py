@@ -106,8 +106,7 @@ def test_index_access(inst, index, position):
         assert type(got).__name__ == "SafeString" if inst.text else type(got) is type(inst.samples[0])
         assert inst.value(got) == inst.samples[position]
         expected[position] = inst.samples[(position + 1) % 5]
-        assert set_(v, index, expected[position]) is None and inst.read(v) == expected
-        assert delete(v, index) is None
+        assert set_(v, index, expected[position]) is None and inst.read(v) == expected and delete(v, index) is None
         del expected[position]
     assert inst.read(v) == expected
     # A bad element is reported against its own argument before the index is looked at.
