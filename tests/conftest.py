@@ -18,8 +18,7 @@ def registered_classes():
 
 @pytest.fixture(scope="session")
 def peer(tmp_path_factory):
-    """A second module of the family, built for the tests, that looks inside the runtime and makes
-    objects the way the library does."""
+    """The test-only second module of the family: it looks inside the runtime and makes objects as the library does."""
     return build.peer(tmp_path_factory.mktemp("peer"))
 
 

@@ -66,9 +66,8 @@ def test_in_place_operators_move_the_object_and_take_ownership():
 @pytest.mark.parametrize("left, right", [("begin", "rbegin"), ("rend", "end"), ("iterator", "rbegin")])
 def test_different_kinds_do_not_relate(left, right):
     v = m.new_vectord([1.0, 2.0])
-    pairs = [(getattr(m, "vectord_" + left)(v), getattr(m, "vectord_" + right)(v)),
-             (m.vectord_begin(v), m.vectorf_begin(m.new_vectorf()))]
-    for a, b in pairs:
+    for a, b in [(getattr(m, "vectord_" + left)(v), getattr(m, "vectord_" + right)(v)),
+                 (m.vectord_begin(v), m.vectorf_begin(m.new_vectorf()))]:  # another kind, another vector type
         for operator in (m.SwigPyIterator___eq__, m.SwigPyIterator___ne__, m.SwigPyIterator___sub__):
             raises(ValueError, "bad iterator type", operator, a, b)
         for relation in (m.SwigPyIterator_distance, m.SwigPyIterator_equal):  # raise the native exception itself

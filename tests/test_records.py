@@ -199,10 +199,9 @@ def test_text_fields_are_borrowed_from_the_record(registered_classes, name, fiel
 def test_fields_of_one_record_do_not_overlap(registered_classes):
     record = registered_classes["Output_ReconstructSettings"]()
     fields = [(f, k) for n, f, k in CREATABLE_FIELDS if n == "Output_ReconstructSettings" and k != "s"]
-    values = {}
-    for i, (field, kind) in enumerate(fields):
-        values[field] = {"b": i % 2 == 0, "d": i + 0.5}.get(kind, i + 1)
-        fn(f"Output_ReconstructSettings_{field}_set")(record, values[field])
+    values = {field: {"b": i % 2 == 0, "d": i + 0.5}.get(kind, i + 1) for i, (field, kind) in enumerate(fields)}
+    for field, value in values.items():
+        fn(f"Output_ReconstructSettings_{field}_set")(record, value)
     assert {f: fn(f"Output_ReconstructSettings_{f}_get")(record) for f, _ in fields} == values
 
 

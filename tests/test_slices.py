@@ -52,8 +52,7 @@ def model_set(items, i, j, step, source):
     where = positions(i, j, step, len(items), True)
     if len(where) != len(source):
         return f"attempt to assign sequence of size {len(source)} to extended slice of size {len(where)}"
-    replaced = dict(zip(where, source))
-    return [replaced.get(k, x) for k, x in enumerate(items)]
+    return [dict(zip(where, source)).get(k, x) for k, x in enumerate(items)]
 
 
 # ---- comparisons ----------------------------------------------------------------------------

@@ -12,8 +12,7 @@ from conftest import overload_text, raises
 class Instance:
     def __init__(self, prefix, element, samples, wrong):  # five distinct elements; one refused element
         self.prefix, self.samples, self.wrong = prefix, samples, wrong
-        self.container = f"std::vector< {element} >"
-        self.source = f"std::vector< {element},std::allocator< {element} > >"
+        self.container, self.source = f"std::vector< {element} >", f"std::vector< {element},std::allocator< {element} > >"
         self.packed, self.text = element == "bool", prefix == "vectorss"
         self.value_type = self.container + ("::value_type" if self.packed else "::value_type const &")
         self.new = getattr(m, "new_" + prefix)
