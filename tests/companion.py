@@ -1,9 +1,5 @@
-"""A minimal stand-in for the companion script module: one script class per wrapped class.
-
-Each class passes itself to its `_swigregister` function, names its `delete_` function as
-`__swig_destroy__`, and (when the class has a `new_` function) attaches the new proxy to the
-instance through its `_swiginit` function, as the real companion module does.
-"""
+"""A minimal stand-in for the companion script module: one class per wrapped class, registered through
+its `_swigregister` function, destroyed by its `delete_` function, initialised through `new_` and `_swiginit`."""
 import _Client3
 
 classes = {}
@@ -11,17 +7,11 @@ classes = {}
 
 def _make_class(name):
     namespace = {}
-    destroy = getattr(_Client3, "delete_" + name, None)
-    if destroy is not None:
-        namespace["__swig_destroy__"] = destroy
-    new = getattr(_Client3, "new_" + name, None)
-    if new is not None:
-        init = getattr(_Client3, name + "_swiginit")
-
-        def __init__(self, *args):
-            init(self, new(*args))
-
-        namespace["__init__"] = __init__
+    if hasattr(_Client3, "delete_" + name):
+        namespace["__swig_destroy__"] = getattr(_Client3, "delete_" + name)
+    if hasattr(_Client3, "new_" + name):
+        new, init = getattr(_Client3, "new_" + name), getattr(_Client3, name + "_swiginit")
+        namespace["__init__"] = lambda self, *args: init(self, new(*args))
     return type(name, (object,), namespace)
 
 

@@ -18,9 +18,29 @@ def registered_classes():
 
 @pytest.fixture(scope="session")
 def peer(tmp_path_factory):
-    """A second module of the family, built for the tests, that looks inside the runtime and makes
-    objects the way the library does."""
-    return build.peer(lambda: tmp_path_factory.mktemp("peer"))
+    """The test-only second module of the family: it looks inside the runtime and makes objects as the library does."""
+    return build.peer(tmp_path_factory.mktemp("peer"))
+
+
+@pytest.fixture
+def safe_string_class():
+    """Lets a test register its own class for SafeString; the companion class is put back after."""
+    yield
+    companion._Client3.SafeString_swigregister(companion.classes["SafeString"])
+
+
+def raises(exception, text, function, *args):
+    """function(*args) must raise `exception` (that very class, when one is given) with exactly the message `text`."""
+    with pytest.raises(exception) as caught:
+        function(*args)
+    assert str(caught.value) == text and (type(caught.value) is exception or isinstance(exception, tuple))
+    return caught.value
+
+
+def overload_text(name, *prototypes):
+    """The message of an overloaded function that no overload accepts."""
+    lines = "".join(f"    {p}\n" for p in prototypes)
+    return f"Wrong number or type of arguments for overloaded function '{name}'.\n  Possible C/C++ prototypes are:\n{lines}"
 
 
 def run_python(code):

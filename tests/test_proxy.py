@@ -1,226 +1,140 @@
 """The pointer proxy objects: representation, comparison, ownership, chains, destruction and the
 packed values."""
+import operator
+import os
 import sys
 
 import pytest
 
 import _Client3
 import companion
-from conftest import run_python
+from conftest import raises, run_python
 from peer import build
 
 SAFE_STRING = "_p_ZarvoSDKClientCPP__SafeString"
-NO_SHADOW = 2
-OWN = 1
+NO_SHADOW, OWN = 2, 1
+SAFE_STRING_NAME = "std::vector< ZarvoSDKClientCPP::SafeString >::value_type *"
 LEAK = "swig/python detected a memory leak of type '{}', no destructor found.\n"
-
-
-@pytest.fixture
-def safe_string_class():
-    """Lets a test register its own class for SafeString; the companion class is put back after."""
-    yield
-    _Client3.SafeString_swigregister(companion.classes["SafeString"])
 
 
 def shown(proxy, name):
     return "<Swig Object of type '%s' at %#x>" % (name, id(proxy))
 
 
-@pytest.mark.parametrize(
-    "mangled, name",
-    [
-        (SAFE_STRING, "std::vector< ZarvoSDKClientCPP::SafeString >::value_type *"),
-        ("_p_std__vectorT_double_std__allocatorT_double_t_t", "std::vector< double > *"),
-        ("_p_std__vectorT_float_std__allocatorT_float_t_t", "std::vector< float,std::allocator< float > > *"),
-        (
-            "_p_std__vectorT_ZarvoSDKClientCPP__Type_Parameter_std__allocatorT_ZarvoSDKClientCPP__Type_Parameter_t_t",
-            "std::vector< ZarvoSDKClientCPP::Type_Parameter,std::allocator< ZarvoSDKClientCPP::Type_Parameter > > *",
-        ),
-        ("_p_int", "LONG32 *"),
-        ("_p_ZarvoSDKClientCPP__ZarvoPelluxPostClient", "ZarvoSDKClientCPP::ZarvoPelluxPostClient *"),
-        # No readable names: the mangled name is shown.
-        ("_p_ZarvoSDKClientCPP__Output_GetJointDetails", "_p_ZarvoSDKClientCPP__Output_GetJointDetails"),
-        (None, "unknown"),
-    ],
-)
+@pytest.mark.parametrize("mangled, name", [
+    (SAFE_STRING, SAFE_STRING_NAME), ("_p_std__vectorT_double_std__allocatorT_double_t_t", "std::vector< double > *"),
+    ("_p_std__vectorT_float_std__allocatorT_float_t_t", "std::vector< float,std::allocator< float > > *"),
+    ("_p_std__vectorT_ZarvoSDKClientCPP__Type_Parameter_std__allocatorT_ZarvoSDKClientCPP__Type_Parameter_t_t",
+     "std::vector< ZarvoSDKClientCPP::Type_Parameter,std::allocator< ZarvoSDKClientCPP::Type_Parameter > > *"),
+    ("_p_int", "LONG32 *"), ("_p_ZarvoSDKClientCPP__ZarvoPelluxPostClient", "ZarvoSDKClientCPP::ZarvoPelluxPostClient *"),
+    # No readable names: the mangled name is shown.
+    ("_p_ZarvoSDKClientCPP__Output_GetJointDetails", "_p_ZarvoSDKClientCPP__Output_GetJointDetails"), (None, "unknown"),
+])
 def test_repr_shows_the_last_readable_name(peer, mangled, name):
     proxy = peer.make(mangled, 0x1000, NO_SHADOW)
-    assert repr(proxy) == shown(proxy, name)
-    assert proxy.__repr__() == repr(proxy)
-    assert str(proxy) == repr(proxy)
+    assert repr(proxy) == shown(proxy, name) == proxy.__repr__() == str(proxy)
 
 
 def test_repr_of_module_made_proxy_and_of_a_chain(peer):
-    first = _Client3.new_SafeString()
-    second = peer.make("_p_int", 0x2000, NO_SHADOW)
-    third = peer.make("_p_char", 0x3000, NO_SHADOW)
-    alone = repr(first)
-    assert alone == shown(first, "std::vector< ZarvoSDKClientCPP::SafeString >::value_type *")
-    second.append(third)
-    first.append(second)
-    assert repr(first) == alone + shown(second, "LONG32 *") + shown(third, "char *")
+    first, second, third = (_Client3.new_SafeString(), peer.make("_p_int", 0x2000, NO_SHADOW),
+                            peer.make("_p_char", 0x3000, NO_SHADOW))
+    assert repr(first) == shown(first, SAFE_STRING_NAME) and second.append(third) is None and first.append(second) is None
+    assert repr(first) == shown(first, SAFE_STRING_NAME) + shown(second, "LONG32 *") + shown(third, "char *")
 
 
 def test_proxy_type_object():
     proxy = _Client3.new_SafeString()
     kind = type(proxy)
-    assert kind.__name__ == "SwigPyObject"
-    assert kind.__doc__ == "Swig object carries a C/C++ instance pointer"
+    assert (kind.__name__, kind.__doc__) == ("SwigPyObject", "Swig object carries a C/C++ instance pointer")
     # (The table's "__repr__" entry is shadowed by the representation slot's own wrapper.)
-    docs = {name: getattr(kind, name).__doc__ for name in ("disown", "acquire", "own", "append", "next")}
-    assert docs == {
-        "disown": "releases ownership of the pointer",
-        "acquire": "acquires ownership of the pointer",
-        "own": "returns/sets ownership of the pointer",
-        "append": "appends another 'this' object",
-        "next": "returns the next 'this' object",
-    }
-    with pytest.raises(TypeError):
-        hash(proxy)
-    with pytest.raises(AttributeError):
-        proxy.anything = 1
-    with pytest.raises(TypeError):
-        kind()
+    assert [getattr(kind, name).__doc__ for name in ("disown", "acquire", "own", "append", "next")] == [
+        "releases ownership of the pointer", "acquires ownership of the pointer", "returns/sets ownership of the pointer",
+        "appends another 'this' object", "returns the next 'this' object"]
+    for call, error in ((lambda: hash(proxy), TypeError), (lambda: setattr(proxy, "anything", 1), AttributeError),
+                        (kind, TypeError)):
+        pytest.raises(error, call)
 
 
-@pytest.mark.parametrize(
-    "left, right, equal",
-    [
-        ((SAFE_STRING, 0x10), (SAFE_STRING, 0x10), True),
-        ((SAFE_STRING, 0x10), ("_p_int", 0x10), True),  # the descriptors do not take part
-        ((SAFE_STRING, 0x10), (SAFE_STRING, 0x18), False),
-        (("_p_char", 2**64 - 8), ("_p_char", 8), False),
-    ],
-)
-def test_equality_compares_addresses(peer, left, right, equal):
-    a = peer.make(left[0], left[1], NO_SHADOW)
-    b = peer.make(right[0], right[1], NO_SHADOW)
-    assert (a == b) is equal
-    assert (a != b) is (not equal)
-    assert (b == a) is equal
-
-
-@pytest.mark.parametrize("compare", [lambda a, b: a < b, lambda a, b: a <= b, lambda a, b: a > b, lambda a, b: a >= b])
-def test_ordering_is_not_supported(peer, compare):
-    a = peer.make("_p_int", 0x10, NO_SHADOW)
-    b = peer.make("_p_int", 0x20, NO_SHADOW)
-    with pytest.raises(TypeError):
-        compare(a, b)
+# The descriptors take no part.
+@pytest.mark.parametrize("left, right, equal", [
+    ((SAFE_STRING, 0x10), (SAFE_STRING, 0x10), True), ((SAFE_STRING, 0x10), ("_p_int", 0x10), True),
+    ((SAFE_STRING, 0x10), (SAFE_STRING, 0x18), False), (("_p_char", 2**64 - 8), ("_p_char", 8), False),
+])
+def test_equality_compares_addresses_and_there_is_no_ordering(peer, left, right, equal):
+    a, b = peer.make(left[0], left[1], NO_SHADOW), peer.make(right[0], right[1], NO_SHADOW)
+    assert (a == b) is equal and (a != b) is (not equal) and (b == a) is equal
+    for compare in (operator.lt, operator.le, operator.gt, operator.ge):
+        pytest.raises(TypeError, compare, a, b)
 
 
 @pytest.mark.parametrize("address", [1, 0x7FFF0000, 2**63 + 8, 2**64 - 1])
 def test_int_is_the_native_address(peer, address):
     assert int(peer.make("_p_int", address, NO_SHADOW)) == address
-
-
-def test_null_address_makes_none(peer):
-    assert peer.make("_p_int", 0, NO_SHADOW | OWN) is None
-
-
-def test_module_proxy_int_matches_conversion(peer):
-    proxy = _Client3.new_SafeString()
-    assert peer.convert(proxy, SAFE_STRING, 0)[1] == int(proxy) != 0
+    assert peer.make("_p_int", 0, NO_SHADOW | OWN) is None  # a null address makes None
 
 
 # (flags made with, calls as (method, args), results, ownership after)
-@pytest.mark.parametrize(
-    "flags, calls, results, owning",
-    [
-        (OWN, [("own", ())], [True], True),
-        (OWN, [("own", (0,)), ("own", ())], [True, False], False),
-        (0, [("own", (1,)), ("own", ())], [False, True], True),
-        (0, [("own", ("yes",))], [False], True),
-        (OWN, [("own", ([],))], [True], False),
-        (OWN, [("disown", ()), ("own", ())], [None, False], False),
-        (0, [("acquire", ()), ("acquire", ())], [None, None], True),
-    ],
-)
+@pytest.mark.parametrize("flags, calls, results, owning", [
+    (OWN, [("own", ())], [True], True), (OWN, [("own", (0,)), ("own", ())], [True, False], False),
+    (0, [("own", (1,)), ("own", ())], [False, True], True), (0, [("own", ("yes",))], [False], True),
+    (OWN, [("own", ([],))], [True], False), (OWN, [("disown", ()), ("own", ())], [None, False], False),
+    (0, [("acquire", ()), ("acquire", ())], [None, None], True),
+])
 def test_ownership_methods(peer, flags, calls, results, owning):
     proxy = peer.make("_p_int", 0x40, NO_SHADOW | flags)
     try:
-        assert [getattr(proxy, name)(*args) for name, args in calls] == results
-        assert proxy.own() is owning
+        assert [getattr(proxy, name)(*args) for name, args in calls] == results and proxy.own() is owning
     finally:
         proxy.disown()  # the fake address must never reach a destructor
 
 
-def test_own_with_failing_truth_value_sets_ownership_and_keeps_the_error(peer):
-    class Bad:
-        def __bool__(self):
-            raise ZeroDivisionError("no truth")
-
-    proxy = peer.make("_p_int", 0x40, NO_SHADOW)
-    with pytest.raises(SystemError) as raised:
-        proxy.own(Bad())
-    assert isinstance(raised.value.__cause__, ZeroDivisionError)
+def test_own_refusals(peer):
+    proxy = _Client3.new_SafeString()
+    raises(TypeError, "own expected at most 1 arguments, got 2", proxy.own, 1, 2)
     assert proxy.own() is True
+    # A failing truth value still sets ownership, and its error is kept.
+    proxy = peer.make("_p_int", 0x40, NO_SHADOW)
+    raised = pytest.raises(SystemError, proxy.own, type("Bad", (), {"__bool__": lambda self: 1 / 0})())
+    assert isinstance(raised.value.__cause__, ZeroDivisionError) and proxy.own() is True
     proxy.disown()
 
 
-def test_own_argument_count():
-    proxy = _Client3.new_SafeString()
-    with pytest.raises(TypeError) as raised:
-        proxy.own(1, 2)
-    assert str(raised.value) == "own expected at most 1 arguments, got 2"
-    assert proxy.own() is True
-
-
 def test_append_and_next(peer):
-    proxy = _Client3.new_SafeString()
-    first = peer.make("_p_int", 0x50, NO_SHADOW)
-    second = _Client3.new_SafeString()
-    assert proxy.next() is None
-    assert proxy.append(first) is None
-    assert proxy.next() is first
+    proxy, first, second = _Client3.new_SafeString(), peer.make("_p_int", 0x50, NO_SHADOW), _Client3.new_SafeString()
+    assert proxy.next() is None and proxy.append(first) is None and proxy.next() is first
     before = sys.getrefcount(first)
-    assert proxy.append(second) is None
-    assert proxy.next() is second
-    # The replaced link is not released.
-    assert sys.getrefcount(first) == before
-
-
-@pytest.mark.parametrize("other", [5, None, "this", object(), lambda: companion.classes["SafeString"]()])
-def test_append_refuses_non_proxies(other):
-    other = other() if callable(other) else other
-    proxy = _Client3.new_SafeString()
-    kept = _Client3.new_SafeString()
-    proxy.append(kept)
-    with pytest.raises(TypeError) as raised:
-        proxy.append(other)
-    assert str(raised.value) == "Attempt to append a non SwigPyObject"
-    assert proxy.next() is kept
+    assert proxy.append(second) is None and proxy.next() is second
+    assert sys.getrefcount(first) == before  # the replaced link is not released
+    for other in (5, None, "this", object(), companion.classes["SafeString"]()):
+        raises(TypeError, "Attempt to append a non SwigPyObject", proxy.append, other)
+        assert proxy.next() is second
 
 
 # ---- Destruction --------------------------------------------------------------------------------
 
 
-def test_python_destroy_gets_a_temporary_non_owning_proxy(safe_string_class):
+@pytest.mark.parametrize("pending", [False, True])
+def test_python_destroy_gets_a_temporary_non_owning_proxy(safe_string_class, pending):
     seen = []
 
     def destroy(proxy):
-        seen.append((type(proxy).__name__, int(proxy), proxy.own(), repr(proxy).split(" at ")[0]))
+        seen.append((type(proxy).__name__, int(proxy), proxy.own(), repr(proxy).split(" at ")[0], sys.exc_info()[0]))
         _Client3.delete_SafeString(proxy)
 
     _Client3.SafeString_swigregister(type("SafeString", (), {"__swig_destroy__": destroy}))
-    proxy = _Client3.new_SafeString()
-    address = int(proxy)
-    del proxy
-    assert seen == [
-        ("SwigPyObject", address, False, "<Swig Object of type 'std::vector< ZarvoSDKClientCPP::SafeString >::value_type *'")
-    ]
-
-
-def test_non_owning_and_disowned_proxies_are_not_destroyed(safe_string_class):
-    calls = []
-    _Client3.SafeString_swigregister(type("SafeString", (), {"__swig_destroy__": lambda p: calls.append(int(p))}))
-    proxy = _Client3.new_SafeString()
-    proxy.disown()
-    del proxy
-    assert calls == []
-    borrowed = _Client3.new_SafeString()
-    _Client3.delete_SafeString(borrowed)  # the delete wrapper takes ownership away first
-    del borrowed
-    assert calls == []
+    proxies = [_Client3.new_SafeString()]
+    address = int(proxies[0])
+    if pending:  # the argument tuple, the last holder, goes while the TypeError is pending: it is set aside
+        with pytest.raises(TypeError, match="^in method 'ToString'"):
+            _Client3.ToString(proxies.pop())
+    else:
+        del proxies[0]
+    # Disowned proxies are not destroyed (the delete function takes ownership away first).
+    for disown in (lambda proxy: proxy.disown(), _Client3.delete_SafeString):
+        proxy = _Client3.new_SafeString()
+        disown(proxy)
+        del proxy
+    assert seen == [("SwigPyObject", address, False, f"<Swig Object of type '{SAFE_STRING_NAME}'", None)]
 
 
 @pytest.mark.parametrize("builtin", [False, True])
@@ -236,86 +150,49 @@ def test_failing_destroy_is_reported_and_the_pending_error_kept(monkeypatch, saf
     destroy = len if builtin else failing
     _Client3.SafeString_swigregister(type("SafeString", (), {"__swig_destroy__": destroy}))
     # The argument tuple, and with it the owning proxy, is released while the TypeError is pending.
-    with pytest.raises(TypeError) as raised:
+    with pytest.raises(TypeError) as raised:  # (the call must hold the only reference to the proxy)
         _Client3.ToString(_Client3.new_SafeString())
     assert str(raised.value) == "in method 'ToString', argument 1 of type 'ZarvoSDKClientCPP::ResultCode::Enum'"
-    assert len(reports) == 1
-    assert reports[0].object is destroy
-    expected = TypeError if builtin else KeyError
-    assert type(reports[0].exc_value) is expected
-    if builtin:
-        assert "SwigPyObject" in str(reports[0].exc_value)
+    assert [(report.object, type(report.exc_value)) for report in reports] == [(destroy, TypeError if builtin else KeyError)]
+    assert not builtin or "SwigPyObject" in str(reports[0].exc_value)
 
 
-def test_destroy_runs_with_the_pending_error_set_aside(safe_string_class):
-    seen = []
-
-    def destroy(proxy):
-        seen.append(sys.exc_info()[0])
-        _Client3.delete_SafeString(proxy)
-
-    _Client3.SafeString_swigregister(type("SafeString", (), {"__swig_destroy__": destroy}))
-    with pytest.raises(TypeError, match="^in method 'ToString'"):
-        _Client3.ToString(_Client3.new_SafeString())
-    assert seen == [None]
+REGISTER = "_Client3.SafeString_swigregister(type('S', (), {%s})); "
 
 
-SAFE_STRING_NAME = "std::vector< ZarvoSDKClientCPP::SafeString >::value_type *"
-
-
-@pytest.mark.parametrize(
-    "body, output",
-    [
-        # Owned and never registered: one leak line, and nothing destroyed.
-        ("p = _Client3.new_SafeString(); del p", LEAK.format(SAFE_STRING_NAME)),
-        ("p = _Client3.new_SafeString(); p.disown(); del p", ""),
-        # Registered without a destructor.
-        (
-            "_Client3.SafeString_swigregister(type('S', (), {})); p = _Client3.new_SafeString(); del p",
-            LEAK.format(SAFE_STRING_NAME),
-        ),
-        # Registered with the delete function: destroyed, no line.
-        (
-            "_Client3.SafeString_swigregister(type('S', (), {'__swig_destroy__': _Client3.delete_SafeString}));"
-            "[_Client3.new_SafeString() for i in range(1000)]",
-            "",
-        ),
-        ("p = peer.make('_p_int', 64, 3); del p", LEAK.format("LONG32 *")),
-        ("p = peer.make(None, 64, 3); del p", LEAK.format("unknown")),
-        (
-            "p = peer.make('_p_ZarvoSDKClientCPP__Output_GetTrialName', 64, 3); del p",
-            LEAK.format("_p_ZarvoSDKClientCPP__Output_GetTrialName"),
-        ),
-        # A proxy that acquired ownership later leaks like any other owner.
-        ("p = peer.make('_p_char', 64, 2); p.acquire(); del p", LEAK.format("char *")),
-    ],
-)
+@pytest.mark.parametrize("body, output", [
+    # Owned and never registered, or registered without a destructor: one leak line, nothing destroyed.
+    ("p = _Client3.new_SafeString(); del p", LEAK.format(SAFE_STRING_NAME)),
+    ("p = _Client3.new_SafeString(); p.disown(); del p", ""),
+    (REGISTER % "" + "p = _Client3.new_SafeString(); del p", LEAK.format(SAFE_STRING_NAME)),
+    # Registered with the delete function: destroyed, no line.
+    (REGISTER % "'__swig_destroy__': _Client3.delete_SafeString" + "[_Client3.new_SafeString() for i in range(1000)]", ""),
+    ("p = peer.make('_p_int', 64, 3); del p", LEAK.format("LONG32 *")),
+    ("p = peer.make(None, 64, 3); del p", LEAK.format("unknown")),
+    ("p = peer.make('_p_ZarvoSDKClientCPP__Output_GetTrialName', 64, 3); del p",
+     LEAK.format("_p_ZarvoSDKClientCPP__Output_GetTrialName")),
+    # A proxy that acquired ownership later leaks like any other owner.
+    ("p = peer.make('_p_char', 64, 2); p.acquire(); del p", LEAK.format("char *")),
+    # Every class that scripts make and delete (the records among them) has its destructor: no line.
+    ("sys.path.insert(0, %r); import companion; c = companion.register()\n"
+     "for n in [n for n in c if hasattr(_Client3, 'new_' + n) and hasattr(_Client3, 'delete_' + n)] * 3:\n"
+     "    r = c[n](); getattr(_Client3, 'delete_' + n)(getattr(_Client3, 'new_' + n)()); del r" % os.path.dirname(__file__), ""),
+])
 def test_leak_line(peer, body, output):
-    rc, out, err = run_python("import _Client3\n" + build.import_lines(peer.__file__) + body)
-    assert (rc, err) == (0, "")
-    assert out == output
+    assert run_python("import _Client3\n" + build.import_lines(peer.__file__) + body) == (0, output, "")
 
 
 # ---- Packed values ------------------------------------------------------------------------------
 
 
-@pytest.mark.parametrize(
-    "data, hexadecimal",
-    [
-        (b"", ""),
-        (b"\x01\xab\x00\xff", "01ab00ff"),
-        (bytes(range(16)), "000102030405060708090a0b0c0d0e0f"),
-        (b"\x5a" * 511, "5a" * 511),  # 2 * 511 + 2 = 1024 still fits
-        (b"\x5a" * 512, None),
-    ],
-)
+# 2 * 511 + 2 = 1024 characters still fit.
+@pytest.mark.parametrize("data, hexadecimal", [(b"", ""), (b"\x01\xab\x00\xff", "01ab00ff"),
+                                               (bytes(range(16)), "000102030405060708090a0b0c0d0e0f"),
+                                               (b"\x5a" * 511, "5a" * 511), (b"\x5a" * 512, None)])
 def test_packed_representation(peer, data, hexadecimal):
     packed = peer.packed(data, "_p_int")
-    assert type(packed).__name__ == "SwigPyPacked"
-    assert type(packed).__doc__ == "Swig object carries a C/C++ instance pointer"
-    if hexadecimal is None:
-        assert repr(packed) == "<Swig Packed _p_int>"
-        assert str(packed) == "_p_int"
+    assert (type(packed).__name__, type(packed).__doc__) == ("SwigPyPacked", "Swig object carries a C/C++ instance pointer")
+    if hexadecimal is None:  # too long: the name alone
+        assert (repr(packed), str(packed)) == ("<Swig Packed _p_int>", "_p_int")
     else:
-        assert repr(packed) == "<Swig Packed at _%s_p_int>" % hexadecimal
-        assert str(packed) == "_%s_p_int" % hexadecimal
+        assert (repr(packed), str(packed)) == (f"<Swig Packed at _{hexadecimal}_p_int>", f"_{hexadecimal}_p_int")

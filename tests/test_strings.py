@@ -1,168 +1,188 @@
-"""SafeString: the module's SafeString functions, ToString, and text conversion in both
-directions."""
+"""SafeString functions, ToString and text conversion both ways; argument unpacking, error codes and the texts a
+script sees when a call goes wrong."""
+import ctypes
+
 import pytest
 
 import _Client3
 import companion
-from peer import build
+from conftest import overload_text, raises
 
-SAFE_STRING = "_p_ZarvoSDKClientCPP__SafeString"
 TEXT_FUNCTIONS = ["SafeString_Value", "SafeString___str__", "SafeString___repr__"]
 
 
-def test_default_safe_string():
-    proxy = _Client3.new_SafeString()
-    assert type(proxy).__name__ == "SwigPyObject"
-    assert proxy.own() is True
-    assert _Client3.SafeString_IsEmpty(proxy) is True
-    assert [getattr(_Client3, name)(proxy) for name in TEXT_FUNCTIONS] == ["", "", ""]
-    instance = companion.classes["SafeString"]()
-    assert _Client3.SafeString_IsEmpty(instance) is True
-    assert _Client3.SafeString_Value(instance) == ""
+def test_default_safe_string_and_delete(peer):
+    proxy, instance = _Client3.new_SafeString(), companion.classes["SafeString"]()
+    assert type(proxy).__name__ == "SwigPyObject" and proxy.own() is True and instance.this.own() is True
+    for made in (proxy, instance):
+        assert _Client3.SafeString_IsEmpty(made) is True and [getattr(_Client3, n)(made) for n in TEXT_FUNCTIONS] == [""] * 3
+        assert _Client3.delete_SafeString(made) is None
+    assert proxy.own() is False and instance.this.own() is False and _Client3.delete_SafeString(None) is None
+    for bad in (5, "text", object(), peer.make("_p_ZarvoSDKClientCPP__Type_Parameter", 16, 2)):
+        raises(TypeError, "in method 'delete_SafeString', argument 1 of type 'ZarvoSDKClientCPP::SafeString *'",
+               _Client3.delete_SafeString, bad)
 
 
-@pytest.mark.parametrize(
-    "data, text",
-    [
-        (b"abc", "abc"),
-        ("h\u00e9llo \u20ac".encode(), "h\u00e9llo \u20ac"),
-        (b"\xe9", "\udce9"),  # not UTF-8: a lone surrogate, never an error
-        (b"a\xff\xfeb", "a\udcff\udcfeb"),
-        (b"", ""),
-    ],
-)
+# Text that is not UTF-8 comes back with lone surrogates, never an error.
+@pytest.mark.parametrize("data, text", [(b"abc", "abc"), ("h\u00e9llo \u20ac".encode(), "h\u00e9llo \u20ac"),
+                                        (b"\xe9", "\udce9"), (b"a\xff\xfeb", "a\udcff\udcfeb"), (b"", "")])
 def test_library_text_comes_back_as_str(peer, data, text):
     made = peer.library_text(data)
-    assert type(made) is companion.classes["SafeString"]
-    assert made.this.own() is True
+    assert type(made) is companion.classes["SafeString"] and made.this.own() is True
     assert [getattr(_Client3, name)(made) for name in TEXT_FUNCTIONS] == [text] * 3
     assert _Client3.SafeString_IsEmpty(made) is (text == "")
-    assert _Client3.SafeString_Value(made).encode("utf-8", "surrogateescape") == data
 
 
 # What the library receives from a text argument: str as UTF-8, bytes as they stand, both cut at
 # the first NUL; None stands for an empty text.
-@pytest.mark.parametrize(
-    "argument, received",
-    [
-        ("abc", b"abc"),
-        ("h\u00e9llo", "h\u00e9llo".encode()),
-        ("\U0001f600", "\U0001f600".encode()),
-        (b"\xff\xfe", b"\xff\xfe"),
-        ("ab\0cd", b"ab"),
-        (b"ab\0cd", b"ab"),
-        ("", None),
-        (b"", None),
-        (type("Text", (str,), {})("sub"), b"sub"),
-        (type("Data", (bytes,), {})(b"sub"), b"sub"),
-    ],
-)
+@pytest.mark.parametrize("argument, received", [
+    ("abc", b"abc"), ("h\u00e9llo", "h\u00e9llo".encode()), ("\U0001f600", "\U0001f600".encode()),
+    (b"\xff\xfe", b"\xff\xfe"), ("ab\0cd", b"ab"), (b"ab\0cd", b"ab"), ("", None), (b"", None),
+    (type("Text", (str,), {})("sub"), b"sub"), (type("Data", (bytes,), {})(b"sub"), b"sub"),
+])
 def test_text_argument(peer, argument, received):
     assert peer.echo(argument) == received
 
 
-@pytest.mark.parametrize(
-    "argument",
-    [5, 1.5, None, bytearray(b"abc"), memoryview(b"abc"), ["a"], lambda: _Client3.new_SafeString(),
-     lambda: companion.classes["SafeString"]()],
-)
+@pytest.mark.parametrize("argument", [5, 1.5, None, bytearray(b"abc"), memoryview(b"abc"), ["a"],
+                                      lambda: _Client3.new_SafeString(), lambda: companion.classes["SafeString"]()])
 def test_text_argument_refuses_other_objects(peer, argument):
     argument = argument() if callable(argument) else argument
-    with pytest.raises(TypeError) as raised:
-        peer.echo(argument)
-    assert str(raised.value) == "Expected string type"
+    raises(TypeError, "Expected string type", peer.echo, argument)
 
 
 def test_unencodable_text_leaves_its_error_pending(peer):
-    with pytest.raises(SystemError) as raised:
+    with pytest.raises(SystemError) as raised:  # (called directly: how the pending error surfaces depends on the caller)
         peer.echo("a\udcff")
     assert type(raised.value.__cause__) is UnicodeEncodeError
 
 
-def test_new_safe_string_copy_form_refuses_a_safe_string(peer):
+def test_new_safe_string_forms(peer):
+    # Texts and a character pointer proxy make owned views; what they show is not defined, but reading it is safe.
+    chars = ctypes.create_string_buffer(b"hello")
+    for source in ("text", "", "h\u00e9", peer.make("_p_char", ctypes.addressof(chars), 2)):
+        made = _Client3.new_SafeString(source)
+        assert type(made).__name__ == "SwigPyObject" and made.own() is True
+        assert isinstance(_Client3.SafeString_Value(made), str)
+    assert companion.classes["SafeString"]("text").this.own() is True
+    # The copy form is never reached from a script: a SafeString is not text.
     for source in (_Client3.new_SafeString(), peer.library_text(b"abc")):
-        with pytest.raises(TypeError) as raised:
-            _Client3.new_SafeString(source)
-        assert str(raised.value) == "Expected string type"
+        raises(TypeError, "Expected string type", _Client3.new_SafeString, source)
+    raises(ValueError, "invalid null reference in method 'new_SafeString', argument 1 of type 'std::string const &'",
+           _Client3.new_SafeString, None)
 
 
-@pytest.mark.parametrize("text", ["text", "", "h\u00e9"])
-def test_new_safe_string_from_text_is_an_owned_view(text):
-    made = _Client3.new_SafeString(text)
-    assert type(made).__name__ == "SwigPyObject"
-    assert made.own() is True
-    # What such a view shows is not defined; reading it must still be safe.
-    assert isinstance(_Client3.SafeString_Value(made), str)
-    instance = companion.classes["SafeString"](text)
-    assert instance.this.own() is True
-
-
-def test_delete_safe_string():
-    made = _Client3.new_SafeString()
-    assert _Client3.delete_SafeString(made) is None
-    assert made.own() is False
-    assert _Client3.delete_SafeString(None) is None
-    instance = companion.classes["SafeString"]()
-    assert _Client3.delete_SafeString(instance) is None
-    assert instance.this.own() is False
-
-
-@pytest.mark.parametrize("bad", [5, "text", object(), lambda peer: peer.make("_p_ZarvoSDKClientCPP__Type_Parameter", 16, 2)])
-def test_delete_safe_string_refuses_other_objects(peer, bad):
-    bad = bad(peer) if callable(bad) else bad
-    with pytest.raises(TypeError) as raised:
-        _Client3.delete_SafeString(bad)
-    assert str(raised.value) == "in method 'delete_SafeString', argument 1 of type 'ZarvoSDKClientCPP::SafeString *'"
-
-
-@pytest.mark.parametrize(
-    "code, message",
-    [
-        (0, "OK"),
-        (1000, "Unable to communicate with the host application."),
-        (1001, "Host application failed to respond to the information request."),
-        (1002, "Unable to interpret information sent from the host application."),
-        (1003, "Host application encountered an error processing the request."),
-        (1004, "Frame number specified is invalid."),
-        (1005, "Unable to convert output parameter to a numeric value."),
-        (1006, "Invalid number of frames returned, expected one frame."),
-        (1, "Unknown Error"),
-        (999, "Unknown Error"),
-        (1007, "Unknown Error"),
-        (-1, "Unknown Error"),
-        (2**31 - 1, "Unknown Error"),
-        (-(2**31), "Unknown Error"),
-        (False, "OK"),
-        (True, "Unknown Error"),
-    ],
-)
+@pytest.mark.parametrize("code, message", [
+    (0, "OK"), (1000, "Unable to communicate with the host application."),
+    (1001, "Host application failed to respond to the information request."),
+    (1002, "Unable to interpret information sent from the host application."),
+    (1003, "Host application encountered an error processing the request."),
+    (1004, "Frame number specified is invalid."), (1005, "Unable to convert output parameter to a numeric value."),
+    (1006, "Invalid number of frames returned, expected one frame."), (False, "OK"),
+] + [(code, "Unknown Error") for code in (1, 999, 1007, -1, 2**31 - 1, -(2**31), True)] + [
+    (2**31, OverflowError), (-(2**31) - 1, OverflowError), (2**64, OverflowError), ("0", TypeError), (0.0, TypeError),
+    (None, TypeError)])
 def test_to_string(code, message):
-    assert _Client3.ToString(code) == message
+    if isinstance(message, str):
+        assert _Client3.ToString(code) == message
+    else:
+        raises(message, "in method 'ToString', argument 1 of type 'ZarvoSDKClientCPP::ResultCode::Enum'", _Client3.ToString, code)
 
 
-@pytest.mark.parametrize(
-    "code, exception",
-    [(2**31, OverflowError), (-(2**31) - 1, OverflowError), (2**64, OverflowError),
-     ("0", TypeError), (0.0, TypeError), (None, TypeError)],
-)
-def test_to_string_refusals(code, exception):
-    with pytest.raises(exception) as raised:
-        _Client3.ToString(code)
-    assert str(raised.value) == "in method 'ToString', argument 1 of type 'ZarvoSDKClientCPP::ResultCode::Enum'"
+# ---- Argument unpacking and error reporting ------------------------------------------------------
+
+OVERLOADS = overload_text("new_SafeString", *(f"ZarvoSDKClientCPP::SafeString::SafeString({p})" for p in (
+    "char const *", "", "std::string const &", "ZarvoSDKClientCPP::SafeString const &")))
 
 
-def test_new_safe_string_from_a_character_pointer_proxy(peer):
-    import ctypes
-
-    text = ctypes.create_string_buffer(b"hello")
-    made = _Client3.new_SafeString(peer.make("_p_char", ctypes.addressof(text), 2))
-    assert type(made).__name__ == "SwigPyObject" and made.own() is True
-    assert isinstance(_Client3.SafeString_Value(made), str)
+class Tuple(tuple):
+    pass
 
 
-def test_new_safe_string_from_none_is_a_null_reference():
-    with pytest.raises(ValueError) as raised:
-        _Client3.new_SafeString(None)
-    assert str(raised.value) == (
-        "invalid null reference in method 'new_SafeString', argument 1 of type 'std::string const &'"
-    )
+# (argument object or None for no object, min, max) -> (result, items), or the TypeError text, or the exception
+@pytest.mark.parametrize("given, low, high, expected", [
+    (None, 0, 0, (1, ())), (None, 1, 1, "f expected 1 arguments, got none"),
+    (None, 1, 2, "f expected at least 1 arguments, got none"), (None, 0, 2, "f expected at least 0 arguments, got none"),
+    ((), 0, 0, (1, ())), ((), 1, 2, "f expected at least 1 arguments, got 0"), ((1,), 2, 2, "f expected 2 arguments, got 1"),
+    ((1, 2), 3, 3, "f expected 3 arguments, got 2"), ((1, 2, 3), 0, 2, "f expected at most 2 arguments, got 3"),
+    ((1, 2, 3), 2, 2, "f expected 2 arguments, got 3"), ((1,), 0, 3, (2, (1, None, None))), ((1, 2), 1, 2, (3, (1, 2))),
+    (Tuple((7, 8)), 2, 2, (3, (7, 8))),
+    # A bare object counts as one argument.
+    (5, 1, 1, (2, (5,))), (5, 0, 3, (2, (5, None, None))), ([1, 2], 1, 2, (2, ([1, 2], None))),
+    # ... but only where one argument is allowed.
+] + [(5, low, high, SystemError("UnpackTuple() argument list is not a tuple")) for low, high in ((2, 2), (0, 0), (2, 3))])
+def test_unpack(peer, given, low, high, expected):
+    if isinstance(expected, tuple):
+        assert peer.unpack(given, "f", low, high) == expected
+    else:
+        expected = TypeError(expected) if isinstance(expected, str) else expected
+        raises(type(expected), str(expected), peer.unpack, given, "f", low, high)
+
+
+def test_error_type(peer):
+    expected = [RuntimeError, OSError, RuntimeError, IndexError, TypeError, ZeroDivisionError, OverflowError,
+                SyntaxError, ValueError, SystemError, AttributeError, MemoryError, RuntimeError]
+    assert [peer.error_type(code) for code in range(-1, -14, -1)] == expected
+    assert [peer.error_type(code) for code in (-14, 0, 7)] == [RuntimeError] * 3  # unknown codes
+
+
+class Unprintable(Exception):
+    def __str__(self):
+        raise ValueError("no text")
+
+
+# (pending exception, message) -> (raised type, text); a class is raised without a value, and an old
+# value without text is replaced by the message.
+@pytest.mark.parametrize("pending, result", [
+    (None, (RuntimeError, "more")), (ValueError("old"), (ValueError, "old more")),
+    (KeyError("k"), (KeyError, "'k' more")), (IndexError, (IndexError, "more")), (Unprintable(), (Unprintable, "more")),
+])
+def test_add_error_msg(peer, pending, result):
+    error = pytest.raises(Exception, peer.add_error_msg, pending, "more").value
+    assert (type(error), error.args) == (result[0], (result[1],))
+
+
+class TypeErrorKind(TypeError):
+    pass
+
+
+@pytest.mark.parametrize("pending, result", [
+    (None, (TypeError, "msg")), (TypeError("inner"), (TypeError, "inner\nAdditional information:\nmsg")),
+    (TypeErrorKind("sub"), (TypeErrorKind, "sub\nAdditional information:\nmsg")), (ValueError("other"), (TypeError, "msg")),
+])
+def test_raise_or_modify_type_error(peer, pending, result):
+    raises(*result, peer.raise_or_modify, pending, "msg")
+
+
+# ---- Through the module's own functions ---------------------------------------------------------
+
+
+# A text that cannot be encoded is taken by no overload either.
+@pytest.mark.parametrize("args, text", [
+    ((1, 2), "new_SafeString expected at most 1 arguments, got 2\nAdditional information:\n" + OVERLOADS),
+    ((1, 2, 3), "new_SafeString expected at most 1 arguments, got 3\nAdditional information:\n" + OVERLOADS),
+    ((5,), OVERLOADS), ((b"bytes",), OVERLOADS), ((1.5,), OVERLOADS), (("a\udcff",), OVERLOADS),
+])
+def test_new_safe_string_overload_errors(args, text):
+    error = raises(TypeError, text, _Client3.new_SafeString, *args)
+    assert error.__cause__ is None and error.__context__ is None
+
+
+SELF = "in method '{}', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'"
+
+
+@pytest.mark.parametrize("name", ["SafeString_IsEmpty", "SafeString_Value", "SafeString___str__", "SafeString___repr__"])
+def test_wrong_self_argument(peer, name):
+    function = getattr(_Client3, name)
+    for bad in (5, "text", b"text", object(), [], type(_Client3.new_SafeString()),
+                peer.make("_p_ZarvoSDKClientCPP__Type_Parameter", 0x10, 2)):
+        raises(TypeError, SELF.format(name), function, bad)
+    # None converts to a null pointer, which is refused rather than used.
+    raises(ValueError, "invalid null reference " + SELF.format(name), function, None)
+
+
+@pytest.mark.parametrize("name", ["SafeString_IsEmpty", "delete_SafeString", "ToString", "SafeString_swigregister"])
+def test_one_object_functions_take_exactly_one(name):
+    for args in ((), (1, 2)):
+        raises(TypeError, f"_Client3.{name}() takes exactly one argument ({len(args)} given)",
+               getattr(_Client3, name), *args)

@@ -1,7 +1,6 @@
-// A second module of the family, built only for the test suite. It compiles the same runtime and the
-// same descriptor table as _Client3, joins the shared type ring at import, and offers functions that
-// look inside its copy of the runtime: the ring, descriptors and cast lists, pointer conversion in
-// both directions, the type cache, packed values, and the text conversions.
+// A second module of the family, built only for the test suite: the same runtime and descriptor table as
+// _Client3, joining the shared type ring at import, with functions that look inside its copy of the runtime
+// (ring, descriptors, cast lists, pointer conversion both ways, type cache, packed values, text conversion).
 #include <cstring>
 
 #include "convert/text.h"
@@ -15,6 +14,13 @@ namespace {
 using ZarvoSDKClientCPP::SafeString;
 
 PyObject* Address(const void* pointer) { return PyLong_FromVoidPtr(const_cast<void*>(pointer)); }
+PyObject* NewRef(PyObject* object) { return Py_XINCREF(object), object; }
+
+// Appends `item` (a new reference, or null after a failure) to `list`; on failure releases the list.
+void Append(PyObject*& list, PyObject* item) {
+  if (!item || PyList_Append(list, item) < 0) Py_CLEAR(list);
+  Py_XDECREF(item);
+}
 
 // The descriptor of a mangled name anywhere in the ring; None selects no descriptor at all.
 bool RingType(PyObject* name, TypeInfo** out) {
@@ -32,18 +38,8 @@ bool RingType(PyObject* name, TypeInfo** out) {
 PyObject* Ring(PyObject*, PyObject*) {
   PyObject* list = PyList_New(0);
   ModuleInfo* head = GetModule();
-  if (!list || !head) return list;
-  ModuleInfo* module = head;
-  do {
-    PyObject* item = Address(module);
-    if (!item || PyList_Append(list, item) < 0) {
-      Py_XDECREF(item);
-      Py_DECREF(list);
-      return nullptr;
-    }
-    Py_DECREF(item);
-    module = module->next;
-  } while (module != head);
+  for (ModuleInfo* module = head; list && module; module = module->next == head ? nullptr : module->next)
+    Append(list, Address(module));
   return list;
 }
 
@@ -54,11 +50,8 @@ PyObject* Casts(PyObject*, PyObject* name) {
   TypeInfo* type;
   if (!RingType(name, &type)) return nullptr;
   PyObject* list = PyList_New(0);
-  for (CastInfo* cast = type ? type->casts : nullptr; list && cast; cast = cast->next) {
-    PyObject* item = PyUnicode_FromString(cast->type->mangledName);
-    if (!item || PyList_Append(list, item) < 0) Py_CLEAR(list);
-    Py_XDECREF(item);
-  }
+  for (CastInfo* cast = type ? type->casts : nullptr; list && cast; cast = cast->next)
+    Append(list, PyUnicode_FromString(cast->type->mangledName));
   return list;
 }
 
@@ -79,8 +72,7 @@ PyObject* Descriptor(PyObject*, PyObject* name) {
 // The address of the descriptor that an object's proxy carries, or None.
 PyObject* ProxyType(PyObject*, PyObject* object) {
   SwigPyObject* proxy = GetThisProxy(object);
-  if (!proxy) Py_RETURN_NONE;
-  return Address(proxy->type);
+  return proxy ? Address(proxy->type) : NewRef(Py_None);
 }
 
 // make(mangled name or None, address, flags): NewPointerObj.
@@ -91,8 +83,7 @@ PyObject* Make(PyObject*, PyObject* args) {
   TypeInfo* type;
   if (!RingType(name, &type)) return nullptr;
   void* pointer = PyLong_AsVoidPtr(address);
-  if (PyErr_Occurred()) return nullptr;
-  return NewPointerObj(nullptr, pointer, type, flags);
+  return PyErr_Occurred() ? nullptr : NewPointerObj(nullptr, pointer, type, flags);
 }
 
 // convert(object, mangled name or None, flags[, outputs]) -> (code, address or None, own):
@@ -106,25 +97,17 @@ PyObject* Convert(PyObject*, PyObject* args) {
   void* pointer = nullptr;
   int own = 0;
   int code = outputs ? ConvertPtr(object, &pointer, type, flags, &own) : ConvertPtr(object, nullptr, type, flags);
-  if (code < 0) return Py_BuildValue("(iOi)", code, Py_None, own);
-  PyObject* address = pointer ? Address(pointer) : (Py_INCREF(Py_None), Py_None);
-  return Py_BuildValue("(iNi)", code, address, own);
+  return Py_BuildValue("(iNi)", code, code >= 0 && pointer ? Address(pointer) : NewRef(Py_None), own);
 }
 
 // The mangled name TypeQuery finds for a text, or None.
 PyObject* Query(PyObject*, PyObject* text) {
   const char* chars = PyUnicode_AsUTF8(text);
-  if (!chars) return nullptr;
-  TypeInfo* type = TypeQuery(chars);
-  if (!type) Py_RETURN_NONE;
-  return PyUnicode_FromString(type->mangledName);
+  TypeInfo* type = chars ? TypeQuery(chars) : nullptr;
+  return type ? PyUnicode_FromString(type->mangledName) : chars ? NewRef(Py_None) : nullptr;
 }
 
-PyObject* Cache(PyObject*, PyObject*) {
-  PyObject* cache = TypeCache();
-  Py_XINCREF(cache);
-  return cache;
-}
+PyObject* Cache(PyObject*, PyObject*) { return NewRef(TypeCache()); }
 
 // packed(bytes, mangled name): a SwigPyPacked holding a copy of the bytes.
 PyObject* Packed(PyObject*, PyObject* args) {
@@ -139,12 +122,9 @@ PyObject* Packed(PyObject*, PyObject* args) {
 
 // The mangled names of this module's static descriptor table, in table order.
 PyObject* Names(PyObject*, PyObject*) {
-  PyObject* list = PyList_New(static_cast<Py_ssize_t>(thisModule.size));
-  for (std::size_t i = 0; list && i < thisModule.size; ++i) {
-    PyObject* item = PyUnicode_FromString(thisModule.typeInitial[i]->mangledName);
-    if (!item) Py_CLEAR(list);
-    else PyList_SET_ITEM(list, static_cast<Py_ssize_t>(i), item);
-  }
+  PyObject* list = PyList_New(0);
+  for (std::size_t i = 0; list && i < thisModule.size; ++i)
+    Append(list, PyUnicode_FromString(thisModule.typeInitial[i]->mangledName));
   return list;
 }
 
@@ -160,48 +140,25 @@ PyObject* Unpack(PyObject*, PyObject* args) {
   Py_ssize_t count = UnpackTuple(given == Py_None ? nullptr : given, name, min, max, items);
   if (!count) return nullptr;
   PyObject* list = PyTuple_New(max);
-  for (Py_ssize_t i = 0; list && i < max; ++i) {
-    PyObject* item = items[i] ? items[i] : Py_None;
-    Py_INCREF(item);
-    PyTuple_SET_ITEM(list, i, item);
-  }
+  for (Py_ssize_t i = 0; list && i < max; ++i) PyTuple_SET_ITEM(list, i, NewRef(items[i] ? items[i] : Py_None));
   return list ? Py_BuildValue("(nN)", count, list) : nullptr;
 }
 
 PyObject* ErrorTypeOf(PyObject*, PyObject* code) {
   int value = PyLong_AsLong(code);
-  if (PyErr_Occurred()) return nullptr;
-  PyObject* type = ErrorType(value);
-  Py_INCREF(type);
-  return type;
+  return PyErr_Occurred() ? nullptr : NewRef(ErrorType(value));
 }
 
-// Makes the given exception (an instance, or a class raised without a value) pending; None leaves
-// nothing pending.
-void SetPending(PyObject* exception) {
-  if (exception == Py_None) return;
-  if (PyExceptionClass_Check(exception))
-    PyErr_SetNone(exception);
-  else
-    PyErr_SetObject(reinterpret_cast<PyObject*>(Py_TYPE(exception)), exception);
-}
-
-// add_error_msg(pending, message) and raise_or_modify(pending, message): always raise.
-PyObject* AddErrorMsgTo(PyObject*, PyObject* args) {
+// add_error_msg(pending, message) and raise_or_modify(pending, message): make `pending` pending (an
+// instance, or a class raised without a value; None leaves nothing pending), then report; always raise.
+template <void (*Report)(const char*)>
+PyObject* Reporting(PyObject*, PyObject* args) {
   PyObject* pending;
   const char* message;
   if (!PyArg_ParseTuple(args, "Os", &pending, &message)) return nullptr;
-  SetPending(pending);
-  AddErrorMsg(message);
-  return nullptr;
-}
-
-PyObject* RaiseOrModify(PyObject*, PyObject* args) {
-  PyObject* pending;
-  const char* message;
-  if (!PyArg_ParseTuple(args, "Os", &pending, &message)) return nullptr;
-  SetPending(pending);
-  RaiseOrModifyTypeError(message);
+  if (PyExceptionClass_Check(pending)) PyErr_SetNone(pending);
+  else if (pending != Py_None) PyErr_SetObject(reinterpret_cast<PyObject*>(Py_TYPE(pending)), pending);
+  Report(message);
   return nullptr;
 }
 
@@ -209,8 +166,7 @@ PyObject* RaiseOrModify(PyObject*, PyObject* args) {
 // text is null or empty.
 constexpr auto Received = [](const SafeString& text) -> PyObject* {
   const char* chars = text.Text();
-  if (!chars || !*chars) Py_RETURN_NONE;
-  return PyBytes_FromString(chars);
+  return chars && *chars ? PyBytes_FromString(chars) : NewRef(Py_None);
 };
 
 // A library-made string (owned through the factory) holding the given text, returned by value.
@@ -245,30 +201,18 @@ using ParameterVector =
             "std::vector< ZarvoSDKClientCPP::Type_Parameter,std::allocator< ZarvoSDKClientCPP::Type_Parameter > > &">;
 
 using Functions = Table<
-    Raw<"ring", NoArgs, Ring>,
-    Raw<"own_module", NoArgs, OwnModule>,
-    Raw<"casts", Object, Casts>,
-    Raw<"descriptor", Object, Descriptor>,
-    Raw<"proxy_type", Object, ProxyType>,
-    Raw<"make", Tuple, Make>,
-    Raw<"convert", Tuple, Convert>,
-    Raw<"query", Object, Query>,
-    Raw<"cache", NoArgs, Cache>,
-    Raw<"packed", Tuple, Packed>,
-    Raw<"names", NoArgs, Names>,
-    Raw<"unpack", Tuple, Unpack>,
-    Raw<"error_type", Object, ErrorTypeOf>,
-    Raw<"add_error_msg", Tuple, AddErrorMsgTo>,
-    Raw<"raise_or_modify", Tuple, RaiseOrModify>,
-    Fn<"echo", Object, Received, String>,
-    Fn<"library_text", Object, LibraryText, String>,
-    Raw<"record", Object, Record>,
+    Raw<"ring", NoArgs, Ring>, Raw<"own_module", NoArgs, OwnModule>, Raw<"casts", Object, Casts>,
+    Raw<"descriptor", Object, Descriptor>, Raw<"proxy_type", Object, ProxyType>, Raw<"make", Tuple, Make>,
+    Raw<"convert", Tuple, Convert>, Raw<"query", Object, Query>, Raw<"cache", NoArgs, Cache>,
+    Raw<"packed", Tuple, Packed>, Raw<"names", NoArgs, Names>, Raw<"unpack", Tuple, Unpack>,
+    Raw<"error_type", Object, ErrorTypeOf>, Raw<"add_error_msg", Tuple, Reporting<AddErrorMsg>>,
+    Raw<"raise_or_modify", Tuple, Reporting<RaiseOrModifyTypeError>>, Fn<"echo", Object, Received, String>,
+    Fn<"library_text", Object, LibraryText, String>, Raw<"record", Object, Record>,
     Fn<"push_parameter", Tuple, PushParameter, ParameterVector, String, String>>;
 
 PyMethodDef methods[Functions::defs.size() + 1];
 
-PyModuleDef moduleDef = {PyModuleDef_HEAD_INIT, "_Client3Peer", nullptr, -1, methods,
-                         nullptr,               nullptr,        nullptr, nullptr};
+PyModuleDef moduleDef = {PyModuleDef_HEAD_INIT, "_Client3Peer", nullptr, -1, methods, nullptr, nullptr, nullptr, nullptr};
 
 }  // namespace
 }  // namespace client3
