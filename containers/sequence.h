@@ -38,45 +38,28 @@ inline int AsSafeString(PyObject* o, SafeString* out) {
   return ResultOk;
 }
 
-// Per element type: the prefix of its vector's functions, the spelling inside "std::vector< ... >" and the argument conversion.
+// Per element type: the prefix of its vector's functions, the spelling inside "std::vector< ... >" and
+// the argument conversion.
+template <Text Prefix, Text Name, auto Convert>
+struct ElementSpelling {
+  static constexpr auto prefix = Prefix;
+  static constexpr auto name = Name;
+  static constexpr auto convert = Convert;
+};
 template <class T>
 struct ElementTraits;
 template <>
-struct ElementTraits<bool> {
-  static constexpr Text prefix = "vectorb";
-  static constexpr Text name = "bool";
-  static constexpr auto convert = AsBool;
-};
+struct ElementTraits<bool> : ElementSpelling<"vectorb", "bool", AsBool> {};
 template <>
-struct ElementTraits<double> {
-  static constexpr Text prefix = "vectord";
-  static constexpr Text name = "double";
-  static constexpr auto convert = AsDouble;
-};
+struct ElementTraits<double> : ElementSpelling<"vectord", "double", AsDouble> {};
 template <>
-struct ElementTraits<float> {
-  static constexpr Text prefix = "vectorf";
-  static constexpr Text name = "float";
-  static constexpr auto convert = AsFloat;
-};
+struct ElementTraits<float> : ElementSpelling<"vectorf", "float", AsFloat> {};
 template <>
-struct ElementTraits<int> {
-  static constexpr Text prefix = "vectori";
-  static constexpr Text name = "int";
-  static constexpr auto convert = AsInt;
-};
+struct ElementTraits<int> : ElementSpelling<"vectori", "int", AsInt> {};
 template <>
-struct ElementTraits<unsigned long long> {
-  static constexpr Text prefix = "vectorull";
-  static constexpr Text name = "unsigned long long";
-  static constexpr auto convert = AsUnsignedLongLong;
-};
+struct ElementTraits<unsigned long long> : ElementSpelling<"vectorull", "unsigned long long", AsUnsignedLongLong> {};
 template <>
-struct ElementTraits<SafeString> {
-  static constexpr Text prefix = "vectorss";
-  static constexpr Text name = "ZarvoSDKClientCPP::SafeString";
-  static constexpr auto convert = AsSafeString;
-};
+struct ElementTraits<SafeString> : ElementSpelling<"vectorss", "ZarvoSDKClientCPP::SafeString", AsSafeString> {};
 
 template <class T>
 using ElementOf = Element<T, ElementTraits<T>::name, ElementTraits<T>::convert>;
