@@ -1,5 +1,5 @@
-// Table lines for the container and iterator families: targets run inside a guard that turns the
-// native exceptions they signal with into script exceptions, and overloaded functions choose their
+// Table lines for the container and iterator families: their targets run `Guarded` (runtime/wrap.h)
+// by translations of the native exceptions they signal with, and overloaded functions choose their
 // form by testing each argument without converting it.
 #pragma once
 
@@ -17,24 +17,6 @@
 #include "runtime/wrap.h"
 
 namespace client3 {
-
-// Calls Target; an exception it throws is given to Translate (called inside the handler), which
-// sets the script exception for the ones it knows and rethrows the rest.
-template <auto Target, auto Translate>
-inline constexpr auto Guarded = [](auto&&... args) -> PyObject* {
-  try {
-    using R = std::invoke_result_t<decltype(Target), decltype(args)...>;
-    if constexpr (std::is_void_v<R>) {
-      std::invoke(Target, std::forward<decltype(args)>(args)...);
-      Py_RETURN_NONE;
-    } else {
-      return ToPython(std::invoke(Target, std::forward<decltype(args)>(args)...));
-    }
-  } catch (...) {
-    Translate();
-    return nullptr;
-  }
-};
 
 // Thrown by a target that has set its script exception already.
 struct Pending {};

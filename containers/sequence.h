@@ -19,25 +19,6 @@ namespace client3 {
 
 using ZarvoSDKClientCPP::SafeString;
 
-// A str or bytes as an owning SafeString (its text duplicated through the library's factory, so
-// the vector never refers to a script object's buffer). With no destination the object is only
-// tested. A str that cannot be encoded leaves its encoding error pending and gives Raised.
-inline int AsSafeString(PyObject* o, SafeString* out) {
-  const char* text;
-  if (PyUnicode_Check(o)) {
-    if (!out) return ResultOk;
-    text = PyUnicode_AsUTF8AndSize(o, nullptr);  // the text ends at an embedded NUL
-    if (!text) return Raised;
-  } else if (PyBytes_Check(o)) {
-    if (!out) return ResultOk;
-    text = PyBytes_AS_STRING(o);
-  } else {
-    return ErrTypeError;
-  }
-  *out = SafeString(ZarvoSDKClientCPP::VStringFactory::Instance(), text);
-  return ResultOk;
-}
-
 // Per element type: the prefix of its vector's functions, the spelling inside "std::vector< ... >" and
 // the argument conversion.
 template <Text Prefix, Text Name, auto Convert>

@@ -39,7 +39,7 @@ int AsCharPtr(PyObject* o, char** out, bool* made) {
     Py_DECREF(bytes);
     return ResultOk;
   }
-  TypeInfo* charType = TypeQuery("_p_char");
+  TypeInfo* charType = CharDescriptor();
   void* pointer = nullptr;
   if (!charType || ConvertPtr(o, &pointer, charType, 0) < 0) return ErrTypeError;
   if (out) *out = static_cast<char*>(pointer);

@@ -13,11 +13,17 @@
 
 namespace client3 {
 
+// The character-pointer descriptor, looked up once.
+inline TypeInfo* CharDescriptor() {
+  static TypeInfo* const type = TypeQuery("_p_char");
+  return type;
+}
+
 // Text of the given length as str; a text too long for the library's 32-bit lengths comes back as
 // a character-pointer proxy.
 inline PyObject* TextToPython(const char* data, std::size_t length) {
   if (!data) Py_RETURN_NONE;
-  if (length >= 0x80000000u) return NewPointerObj(nullptr, const_cast<char*>(data), TypeQuery("_p_char"), 0);
+  if (length >= 0x80000000u) return NewPointerObj(nullptr, const_cast<char*>(data), CharDescriptor(), 0);
   return PyUnicode_DecodeUTF8(data, static_cast<Py_ssize_t>(length), "surrogateescape");
 }
 
@@ -28,6 +34,25 @@ inline PyObject* SafeStringText(const ZarvoSDKClientCPP::SafeString& text) {
   const char* chars = text.Text();
   if (!chars) chars = "";
   return TextToPython(chars, std::strlen(chars));
+}
+
+// A str or bytes as an owning SafeString (its text duplicated through the library's factory, so
+// the copy never refers to a script object's buffer). With no destination the object is only
+// tested. A str that cannot be encoded leaves its encoding error pending and gives Raised.
+inline int AsSafeString(PyObject* o, ZarvoSDKClientCPP::SafeString* out) {
+  const char* text;
+  if (PyUnicode_Check(o)) {
+    if (!out) return ResultOk;
+    text = PyUnicode_AsUTF8AndSize(o, nullptr);  // the text ends at an embedded NUL
+    if (!text) return Raised;
+  } else if (PyBytes_Check(o)) {
+    if (!out) return ResultOk;
+    text = PyBytes_AS_STRING(o);
+  } else {
+    return ErrTypeError;
+  }
+  *out = ZarvoSDKClientCPP::SafeString(ZarvoSDKClientCPP::VStringFactory::Instance(), text);
+  return ResultOk;
 }
 
 // A `SafeString const &` argument: a view, valid for the one call, on the UTF-8 of a str or on the

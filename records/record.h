@@ -13,9 +13,6 @@
 #include <type_traits>
 #include <vector>
 
-// The scalar and text result conversions must be visible before the wrapper templates.
-#include "convert/scalar.h"
-#include "convert/text.h"
 #include "runtime/wrap.h"
 
 namespace client3 {

@@ -36,18 +36,6 @@ std::size_t BuildFunctionTable() {
   return count;
 }
 
-// Hexadecimal of a pointer value, byte by byte from its lowest address.
-char* PackHex(char* out, const void* data, std::size_t size) {
-  static const char hex[] = "0123456789abcdef";
-  const unsigned char* bytes = static_cast<const unsigned char*>(data);
-  for (std::size_t i = 0; i < size; ++i) {
-    *out++ = hex[bytes[i] >> 4];
-    *out++ = hex[bytes[i] & 0xf];
-  }
-  *out = 0;
-  return out;
-}
-
 // Points the docs that name a pointer constant ("swig_ptr: NAME") at the constant's value.
 void FixMethodDocs(PyMethodDef* methods) {
   static const char marker[] = "swig_ptr: ";

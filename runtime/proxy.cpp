@@ -13,18 +13,6 @@ namespace {
 
 constexpr const char* kProxyDoc = "Swig object carries a C/C++ instance pointer";
 
-// Lowercase hexadecimal of the bytes, first byte first, high nibble first.
-char* PackHex(char* out, const void* data, std::size_t size) {
-  static const char hex[] = "0123456789abcdef";
-  const unsigned char* bytes = static_cast<const unsigned char*>(data);
-  for (std::size_t i = 0; i < size; ++i) {
-    *out++ = hex[bytes[i] >> 4];
-    *out++ = hex[bytes[i] & 0xf];
-  }
-  *out = 0;
-  return out;
-}
-
 const char* DisplayName(const TypeInfo* type) {
   const char* name = PrettyTypeName(type);
   return name ? name : "unknown";
@@ -72,6 +60,17 @@ PyObject* ProxyOwn(PyObject* op, PyObject* args) {
 }
 
 }  // namespace
+
+char* PackHex(char* out, const void* data, std::size_t size) {
+  static const char hex[] = "0123456789abcdef";
+  const unsigned char* bytes = static_cast<const unsigned char*>(data);
+  for (std::size_t i = 0; i < size; ++i) {
+    *out++ = hex[bytes[i] >> 4];
+    *out++ = hex[bytes[i] & 0xf];
+  }
+  *out = 0;
+  return out;
+}
 
 PyObject* SwigPyObject_append(PyObject* op, PyObject* other) {
   if (!SwigPyObject_Check(other)) {

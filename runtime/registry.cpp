@@ -356,11 +356,10 @@ PyObject* NewPointerObj(PyObject* self, void* ptr, TypeInfo* type, int flags) {
     if (!cls->tp_new) {
       PyErr_Format(PyExc_TypeError, "cannot create '%s' instances", cls->tp_name);
     } else {
+      // No keywords: creation slots take a null dictionary as an empty one, so none is allocated.
       PyObject* emptyArgs = PyTuple_New(0);
-      PyObject* emptyKw = PyDict_New();
-      if (emptyArgs && emptyKw) instance = cls->tp_new(cls, emptyArgs, emptyKw);
+      if (emptyArgs) instance = cls->tp_new(cls, emptyArgs, nullptr);
       Py_XDECREF(emptyArgs);
-      Py_XDECREF(emptyKw);
     }
     if (instance) {
       if (PyObject_SetAttr(instance, ThisName(), bare) < 0)

@@ -80,6 +80,8 @@ PyTypeObject* SwigPyPacked_type();
 bool SwigPyObject_Check(PyObject* op);
 bool SwigPyPacked_Check(PyObject* op);
 PyObject* SwigPyObject_append(PyObject* proxy, PyObject* other);
+// Lowercase hexadecimal of the bytes, first byte first, high nibble first; returns the end.
+char* PackHex(char* out, const void* data, std::size_t size);
 PyObject* SwigPyPacked_New(void* data, std::size_t size, TypeInfo* type);
 
 // ---- Flags and results ------------------------------------------------------------------------

@@ -25,6 +25,8 @@
 #include <type_traits>
 #include <utility>
 
+#include "convert/scalar.h"  // the result conversions must be declared before the templates
+#include "convert/text.h"
 #include "runtime/runtime.h"
 #include "runtime/text.h"
 #include "runtime/types.h"
@@ -150,10 +152,22 @@ PyObject* ToPython(const T& value) {
   return ToPython(Owned<T>{new T(value)});
 }
 
-// Calls the target and converts what it returns. Native exceptions that escape a target are turned
-// into the nearest interpreter exception rather than being let through the interpreter's frames.
-template <auto Target, class... A>
-PyObject* CallTarget(A&&... args) {
+// The last resort for native exceptions that a target lets escape: they become the nearest
+// interpreter exception rather than being let through the interpreter's frames.
+inline void UnexpectedErrors() {
+  try {
+    throw;
+  } catch (const std::bad_alloc&) {
+    PyErr_NoMemory();
+  } catch (const std::exception& error) {
+    PyErr_SetString(PyExc_RuntimeError, error.what());
+  }
+}
+
+// Calls Target and converts what it returns. An exception it throws is handed to Translate, which
+// runs inside the handler, sets the script exception for the ones it knows and rethrows the rest.
+template <auto Target, auto Translate, class... A>
+PyObject* CallGuarded(A&&... args) {
   try {
     using R = std::invoke_result_t<decltype(Target), A...>;
     if constexpr (std::is_void_v<R>) {
@@ -162,13 +176,17 @@ PyObject* CallTarget(A&&... args) {
     } else {
       return ToPython(std::invoke(Target, std::forward<A>(args)...));
     }
-  } catch (const std::bad_alloc&) {
-    return PyErr_NoMemory();
-  } catch (const std::exception& error) {
-    PyErr_SetString(PyExc_RuntimeError, error.what());
+  } catch (...) {
+    Translate();
     return nullptr;
   }
 }
+
+// A target whose own exceptions are translated by Translate (families that signal errors natively).
+template <auto Target, auto Translate>
+inline constexpr auto Guarded = [](auto&&... args) -> PyObject* {
+  return CallGuarded<Target, Translate>(std::forward<decltype(args)>(args)...);
+};
 
 // ---- Wrappers ---------------------------------------------------------------------------------
 
@@ -176,7 +194,7 @@ template <Text Name, auto Target, class... K, std::size_t... I>
 PyObject* Invoke(PyObject** objects, std::index_sequence<I...>) {
   std::tuple<K...> kinds;
   if (!(Load<Name, I + 1>(std::get<I>(kinds), objects[I]) && ...)) return nullptr;
-  return CallTarget<Target>(std::get<I>(kinds).get()...);
+  return CallGuarded<Target, UnexpectedErrors>(std::get<I>(kinds).get()...);
 }
 
 template <Text Name, Convention Conv, auto Target, class... K>
