@@ -7,6 +7,7 @@
 #include <climits>
 #include <cmath>
 #include <stdexcept>
+#include <type_traits>
 
 #include "runtime/runtime.h"
 #include "runtime/text.h"
@@ -110,9 +111,12 @@ using Bool = ScalarKind<bool, "bool", AsBool>;
 using Float = ScalarKind<float, "float", AsFloat>;
 using Double = ScalarKind<double, "double", AsDouble>;
 
-// An enumeration read as an int.
+// An enumeration read as an int. Every int must be a value of E, which only a fixed underlying type
+// of int guarantees (only such an enumeration can be list-initialised from an int).
 template <class E, Text Type>
 struct EnumKind {
+  static_assert(std::is_same_v<std::underlying_type_t<E>, int> && requires(int v) { E{v}; },
+                "the enumeration needs int as its fixed underlying type");
   static constexpr auto type = Type;
   static constexpr bool reference = false;
   int value = 0;

@@ -210,7 +210,7 @@ def test_base_functions_accept_any_record(registered_classes, peer, name, made):
     """Script-made and library-made records alike; every non-zero result is an error."""
     record = registered_classes[name]() if made else library_record(peer, name)
     assert m.Output_Result_Result_get(record) == 0 and m.Output_Result_Error(record) is False
-    for result in (1003, 1, 0):
+    for result in (1003, 1, -1, 2 ** 31 - 1, 0):
         m.Output_Result_Result_set(record, result)
         assert m.Output_Result_Result_get(record) == result and m.Output_Result_Error(record) is (result != 0)
     m.Output_Result_ResultString_set(record, text("why"))
@@ -244,8 +244,9 @@ CONVERSIONS = {
     "i": [(0, 0), (-5, -5), (True, 1), (False, 0), (Int(7), 7), (2147483647, 2147483647), (-2147483648, -2147483648),
             (2147483648, OverflowError), (-2147483649, OverflowError), (BIG, OverflowError), (1.0, TypeError),
             ("3", TypeError), (None, TypeError), (Index(), TypeError)],
-    "e": [(1003, 1003), (-1, -1), (999, 999), (True, 1), (2 ** 31, OverflowError), (-2 ** 31 - 1, OverflowError),
-             (1.0, TypeError), ("3", TypeError)],
+    # Any 32-bit int is a result code, listed or not.
+    "e": [(1003, 1003), (-1, -1), (999, 999), (1024, 1024), (2 ** 31 - 1, 2 ** 31 - 1), (-2 ** 31, -2 ** 31),
+          (True, 1), (2 ** 31, OverflowError), (-2 ** 31 - 1, OverflowError), (1.0, TypeError), ("3", TypeError)],
     "u": [(0, 0), (4294967295, 4294967295), (True, 1), (2147483648, 2147483648), (-1, OverflowError),
                      (2 ** 32, OverflowError), (1.0, TypeError), ("3", TypeError), (Index(), TypeError)],
     "q": [(0, None), (2 ** 64 - 1, None), (True, None), (-1, OverflowError), (2 ** 64, OverflowError),

@@ -12,7 +12,9 @@
 namespace ZarvoSDKClientCPP {
 
 namespace ResultCode {
-enum Enum {
+// Every 32-bit int is a value of the type: records and ToString take codes beyond the listed ones.
+// int is also the type the enumeration has on the library's own platform, so size and layout stay.
+enum Enum : int {
   Success = 0,
   UnknownStatus = 1,
   NotConnected = 1000,
