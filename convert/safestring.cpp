@@ -1,6 +1,7 @@
 // The SafeString class's module functions and ToString.
 #include <cstring>
 #include <string>
+#include <unordered_set>
 
 #include "convert/scalar.h"
 #include "convert/text.h"
@@ -69,13 +70,13 @@ PyObject* NewOwned(SafeString* text) {
   return NewPointerObj(nullptr, text, TypeFor<SafeString>(), PointerOwn | PointerNoShadow);
 }
 
-// Makes a SafeString that views `text`. The storage is kept for the life of the process: the view
-// never owns it, and releasing it would leave the new string pointing at freed memory.
+// Makes a SafeString that views `text`. The view never owns its storage, and releasing it would leave
+// the new string pointing at freed memory, so the text is kept for the life of the process: each
+// distinct text once, which bounds what a script that makes strings in a loop can pin. The set is
+// never destroyed, so a view stays readable while the interpreter shuts down; its nodes never move.
 PyObject* NewView(const char* text) {
-  std::size_t size = std::strlen(text) + 1;
-  char* kept = new char[size];
-  std::memcpy(kept, text, size);
-  return NewOwned(new SafeString(static_cast<const char*>(kept)));
+  static auto* kept = new std::unordered_set<std::string>();
+  return NewOwned(new SafeString(kept->emplace(text).first->c_str()));
 }
 
 PyObject* NewSafeString(PyObject*, PyObject* args) {

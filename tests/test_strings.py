@@ -72,6 +72,40 @@ def test_new_safe_string_forms(peer):
            _Client3.new_SafeString, None)
 
 
+class MallInfo2(ctypes.Structure):
+    _fields_ = [(name, ctypes.c_size_t) for name in
+                ("arena", "ordblks", "smblks", "hblks", "hblkhd", "usmblks", "fsmblks", "uordblks", "fordblks", "keepcost")]
+
+
+def heap_meter():
+    """A function giving the bytes that the C heap has handed out; the test is skipped where that is not measurable."""
+    libc = ctypes.CDLL(None)
+    if not hasattr(libc, "mallinfo2"):
+        pytest.skip("no mallinfo2 in this C library")
+    libc.mallinfo2.restype = MallInfo2
+    libc.malloc.restype = ctypes.c_void_p
+    before = libc.mallinfo2().uordblks
+    block = libc.malloc(65536)
+    seen = libc.mallinfo2().uordblks - before
+    libc.free(ctypes.c_void_p(block))
+    if seen < 65536:
+        pytest.skip("the allocator in use is not the one mallinfo2 reports on")  # as under the address sanitizer
+    return lambda: libc.mallinfo2().uordblks
+
+
+def test_new_safe_string_keeps_each_text_once():
+    in_use = heap_meter()
+    texts = ["abc", "h\u00e9llo", "a text too long to fit inside the string object itself"]
+    for text in texts * 10:
+        _Client3.new_SafeString(text)
+    before = in_use()
+    for text in texts * 10_000:
+        _Client3.new_SafeString(text)
+    assert in_use() - before < 16_384  # a copy per call would be 30,000 copies, about a megabyte
+    # Each view shows its text.
+    assert [_Client3.SafeString_Value(_Client3.new_SafeString(text)) for text in texts] == texts
+
+
 @pytest.mark.parametrize("code, message", [
     (0, "OK"), (1000, "Unable to communicate with the host application."),
     (1001, "Host application failed to respond to the information request."),
