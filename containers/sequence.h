@@ -166,11 +166,12 @@ int AsVector(PyObject* o, std::vector<T>** out) {
   return NewObjectMask;
 }
 
-// A `std::vector< T,std::allocator< T > > const &` argument: a vector proxy or a sequence. A vector
-// made for the call is deleted with the kind.
-template <class T>
+// A whole-vector argument taken by const reference: a vector proxy or a sequence. A vector made for
+// the call is deleted with the kind. Its messages name `Type`: the allocator spelling unless the
+// function's prototype spells the parameter otherwise (the copy constructor's `std::vector< T > const &`).
+template <class T, Text Type = cat(AllocatorName<T>, " const &")>
 struct SequenceArg {
-  static constexpr auto type = cat(AllocatorName<T>, " const &");
+  static constexpr auto type = Type;
   static constexpr bool reference = true;
   std::vector<T>* value = nullptr;
   bool made = false;

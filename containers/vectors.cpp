@@ -145,9 +145,14 @@ struct Vector {
   static constexpr auto C = ContainerName<T>;
   static constexpr auto Difference = cat(C, "::difference_type");
   static constexpr auto SizeType = cat(C, "::size_type");
-  static constexpr auto ValueType = Pick<packed, cat(C, "::value_type"), cat(C, "::value_type const &")>();
+  // An element is named `value_type` in argument messages; the prototypes take it by const
+  // reference, except the packed bits, which are handed over by value.
+  static constexpr auto ElementType = cat(C, "::value_type");
+  static constexpr auto ValueType = Pick<packed, ElementType, cat(ElementType, " const &")>();
   static constexpr auto IteratorType = cat(C, "::iterator");
+  // A whole vector: the slice assignments name the allocator form, the copy constructor its own.
   static constexpr auto Source = cat(AllocatorName<T>, " const &");
+  static constexpr auto Original = cat(C, " const &");
   static constexpr auto IndexConst = Pick<packed, Text{""}, Text{" const"}>();
   static constexpr auto NewName = cat("new_", ElementTraits<T>::prefix);
 
@@ -159,8 +164,13 @@ struct Vector {
   using IndexSelf = std::conditional_t<packed, HeldMut, HeldConst>;
   using Diff = ScalarKind<int, Difference, AsInt>;
   using Size = ScalarKind<unsigned int, SizeType, AsUnsignedInt>;
-  using Value = ValueArg<T, ValueType>;
+  // Every instance names its element argument `value_type`, the string one too: its element is a
+  // class that the prototypes take by const reference, but an argument message names the declared
+  // type alone, and a text element that is refused says "Expected string type" (or leaves its
+  // encoding error pending) without naming any type. Nothing sets it apart from the others.
+  using Value = ValueArg<T, ElementType>;
   using Seq = SequenceArg<T>;
+  using Copied = SequenceArg<T, Original>;
   using Ref = Pointer<V, cat(C, " &")>;
   using Pos = PositionArg<V, IteratorType>;
 
@@ -339,9 +349,9 @@ struct Vector {
                  OverloadsOf<T, "erase", cat("erase(", IteratorType, ")"), cat("erase(", IteratorType, ",", IteratorType, ")")>,
                  Form<erase, Self, Pos>, Form<eraseRange, Self, Pos, Pos>>,
       Overloaded<NewName,
-                 OverloadMessage<NewName, cat(C, "::vector()"), cat(C, "::vector(", C, " const &)"),
+                 OverloadMessage<NewName, cat(C, "::vector()"), cat(C, "::vector(", Original, ")"),
                                  cat(C, "::vector(", SizeType, ")"), cat(C, "::vector(", SizeType, ",", ValueType, ")")>,
-                 Form<make>, Form<copy, Seq>, Form<sized, Size>, Form<filled, Size, Value>>,
+                 Form<make>, Form<copy, Copied>, Form<sized, Size>, Form<filled, Size, Value>>,
       F<"push_back", Tuple, append, Self, Value>,
       F<"front", Object, front, HeldConst>,
       F<"back", Object, back, HeldConst>,
