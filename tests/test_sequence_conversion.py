@@ -79,8 +79,23 @@ def test_refused_sources_leave_only_the_overload_message(inst):
     for source in ({1, 2}, {0: 1}, (x for x in ()), 1.5, Failing([1]), BadLength([]),
                    [inst.samples[0], inst.wrong], (inst.wrong,), Sequence([inst.wrong, inst.samples[0]])):
         raises(TypeError, inst.new_refused, inst.new, source)
-    raises(ValueError, f"invalid null reference in method 'new_{inst.prefix}', argument 1 of type '{inst.source} const &'",
-           inst.new, None)  # None is a null reference
+
+
+def whole_vector_arguments(inst, v):
+    """Each function that takes a whole vector by const reference: its name, the arguments before the
+    vector, the vector's argument number and its type as the messages spell it."""
+    return [(f"new_{inst.prefix}", (), 1, f"{inst.container} const &"),
+            (f"{inst.prefix}___setslice__", (v, 0, 2), 4, f"{inst.source} const &"),
+            (f"{inst.prefix}___setitem__", (v, slice(0, 2)), 3, f"{inst.source} const &")]
+
+
+@by_instance
+def test_none_is_a_null_reference(inst):
+    v = inst.make()
+    for name, before, position, spelling in whole_vector_arguments(inst, v):
+        raises(ValueError, f"invalid null reference in method '{name}', argument {position} of type '{spelling}'",
+               getattr(m, name), *before, None)
+    assert inst.read(v) == inst.samples
 
 
 @pytest.mark.parametrize("prefix, source, expected", [
@@ -103,12 +118,12 @@ def test_length_is_asked_again_before_every_element():
     assert [m.vectord___getitem__(v, i) for i in range(m.vectord_size(v))] == [1.0, 2.0, 3.0, 4.0, 5.0]
 
 
-@pytest.mark.parametrize("source", [Fickle([1.0, 2.0, 3.0]), ["\ud800"]])
-def test_element_that_fails_only_in_conversion_is_reported_against_the_argument(source):
-    prefix = "vectorss" if isinstance(source, list) else "vectord"
+@pytest.mark.parametrize("prefix, source", [("vectord", lambda: Fickle([1.0, 2.0, 3.0])), ("vectorss", lambda: ["\ud800"])],
+                         ids=["changing sequence", "unencodable text"])
+def test_element_that_fails_only_in_conversion_is_reported_against_the_argument(prefix, source):
     inst = next(i for i in INSTANCES if i.prefix == prefix)
-    raises(TypeError, f"in method 'new_{prefix}', argument 1 of type '{inst.source} const &'", inst.new, source)
     v = inst.make()
-    raises(TypeError, f"in method '{prefix}___setslice__', argument 4 of type '{inst.source} const &'",
-           inst.fn("__setslice__"), v, 0, 2, Fickle(inst.samples[:3]) if prefix == "vectord" else source)
+    for name, before, position, spelling in whole_vector_arguments(inst, v):
+        raises(TypeError, f"in method '{name}', argument {position} of type '{spelling}'",
+               getattr(m, name), *before, source())
     assert inst.read(v) == inst.samples

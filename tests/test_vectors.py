@@ -9,19 +9,40 @@ import companion
 from conftest import overload_text, raises
 
 
+def function_name(prefix, member):
+    return f"new_{prefix}" if member == "new" else f"{prefix}_{member}"
+
+
 class Instance:
     def __init__(self, prefix, element, samples, wrong):  # five distinct elements; one refused element
         self.prefix, self.samples, self.wrong = prefix, samples, wrong
         self.container, self.source = f"std::vector< {element} >", f"std::vector< {element},std::allocator< {element} > >"
         self.packed, self.text = element == "bool", prefix == "vectorss"
-        self.value_type = self.container + ("::value_type" if self.packed else "::value_type const &")
+        self.element = self.container + "::value_type"  # as argument messages name an element
+        self.value_type = self.element + ("" if self.packed else " const &")  # as prototypes take it
         self.new = getattr(m, "new_" + prefix)
-        c, s = self.container, self.container + "::size_type"
-        self.new_refused = overload_text("new_" + prefix, f"{c}::vector()", f"{c}::vector({c} const &)",
-                                         f"{c}::vector({s})", f"{c}::vector({s},{self.value_type})")
+        self.new_refused = self.refused("new")
 
     def fn(self, name):
-        return getattr(m, f"{self.prefix}_{name}")
+        return getattr(m, function_name(self.prefix, name))
+
+    def refused(self, member):
+        """The message of overloaded `member` when no form accepts its arguments."""
+        c, d, s = self.container, self.container + "::difference_type", self.container + "::size_type"
+        it, vt, src = self.container + "::iterator", self.value_type, self.source + " const &"
+        prototypes = {
+            "__getitem__": [f"{c}::__getitem__(PySliceObject *)",
+                            f"{c}::__getitem__({d})" + ("" if self.packed else " const")],
+            "__setitem__": [f"{c}::__setitem__(PySliceObject *,{src})", f"{c}::__setitem__(PySliceObject *)",
+                            f"{c}::__setitem__({d},{vt})"],
+            "__delitem__": [f"{c}::__delitem__({d})", f"{c}::__delitem__(PySliceObject *)"],
+            "__setslice__": [f"{c}::__setslice__({d},{d})", f"{c}::__setslice__({d},{d},{src})"],
+            "erase": [f"{c}::erase({it})", f"{c}::erase({it},{it})"],
+            "new": [f"{c}::vector()", f"{c}::vector({c} const &)", f"{c}::vector({s})", f"{c}::vector({s},{vt})"],
+            "resize": [f"{c}::resize({s})", f"{c}::resize({s},{vt})"],
+            "insert": [f"{c}::insert({it},{vt})", f"{c}::insert({it},{s},{vt})"],
+        }[member]
+        return overload_text(function_name(self.prefix, member), *prototypes)
 
     def make(self, items=None):
         return self.new(list(self.samples if items is None else items))
@@ -49,10 +70,6 @@ ORDER = ("iterator __nonzero__ __bool__ __len__ __getslice__ __setslice__ __dels
 SELF_ONLY = set("iterator __nonzero__ __bool__ __len__ pop empty size begin end rbegin rend clear get_allocator "
                 "pop_back front back capacity swigregister".split())
 OVERLOADED = set("__setslice__ __delitem__ __getitem__ __setitem__ erase resize insert new".split())
-
-
-def function_name(prefix, member):
-    return f"new_{prefix}" if member == "new" else f"{prefix}_{member}"
 
 
 def test_table_order():
@@ -109,7 +126,8 @@ def test_index_access(inst, index, position):
         del expected[position]
     assert inst.read(v) == expected
     # A bad element is reported against its own argument before the index is looked at.
-    text = "Expected string type" if inst.text else f"in method '{inst.prefix}___setitem__', argument 3 of type '{inst.value_type}'"
+    text = f"in method '{inst.prefix}___setitem__', argument 3 of type '{inst.element}'"
+    text = "Expected string type" if inst.text else text
     raises((TypeError, OverflowError), text, set_, v, 99, inst.wrong)
     assert inst.read(v) == expected
 
@@ -119,9 +137,34 @@ def test_append(inst):
     for name in ("append", "push_back"):
         v = inst.new()
         assert [inst.fn(name)(v, item) for item in inst.samples] == [None] * 5
-        text = "Expected string type" if inst.text else f"in method '{inst.prefix}_{name}', argument 2 of type '{inst.value_type}'"
-        raises((TypeError, OverflowError), text, inst.fn(name), v, inst.wrong)
         assert inst.read(v) == inst.samples
+
+
+# Every function that takes an element: its arguments after self, given an iterator at the vector's
+# begin and the element, and the element's argument number; None where the overload test refuses it.
+@by_instance
+@pytest.mark.parametrize("member, arguments, position", [
+    ("append", lambda at, x: (x,), 2),
+    ("push_back", lambda at, x: (x,), 2),
+    ("assign", lambda at, x: (2, x), 3),
+    ("__setitem__", lambda at, x: (1, x), 3),
+    ("resize", lambda at, x: (7, x), None),
+    ("insert", lambda at, x: (at, x), None),
+    ("insert", lambda at, x: (at, 2, x), None),
+    ("new", lambda at, x: (2, x), None),
+], ids=["append", "push_back", "assign", "__setitem__", "resize", "insert", "insert n", "new"])
+def test_refused_element(inst, member, arguments, position):
+    v = inst.make()
+    args = arguments(inst.fn("begin")(v), inst.wrong)
+    name = function_name(inst.prefix, member)
+    if position is None:
+        expected = TypeError, inst.refused(member)
+    elif inst.text:
+        expected = TypeError, "Expected string type"
+    else:
+        expected = (TypeError, OverflowError), f"in method '{name}', argument {position} of type '{inst.element}'"
+    raises(*expected, inst.fn(member), *(args if member == "new" else (v, *args)))
+    assert inst.read(v) == inst.samples
 
 
 @by_instance
@@ -155,27 +198,16 @@ def test_index_and_size_arguments(inst, member, args, position, error, arg_type)
 
 @by_instance
 def test_overload_messages(inst):
-    c, d, s = inst.container, inst.container + "::difference_type", inst.container + "::size_type"
-    it, vt, src = inst.container + "::iterator", inst.value_type, inst.source + " const &"
     v = inst.make()
-    cases = {
-        "__getitem__": ((v, 1.0), [f"{c}::__getitem__(PySliceObject *)", f"{c}::__getitem__({d})" + ("" if inst.packed else " const")]),
-        "__setitem__": ((v, 1.0, 1), [f"{c}::__setitem__(PySliceObject *,{src})", f"{c}::__setitem__(PySliceObject *)",
-                                      f"{c}::__setitem__({d},{vt})"]),
-        "__delitem__": ((v, None), [f"{c}::__delitem__({d})", f"{c}::__delitem__(PySliceObject *)"]),
-        "__setslice__": ((v, 0), [f"{c}::__setslice__({d},{d})", f"{c}::__setslice__({d},{d},{src})"]),
-        "erase": ((v, 0), [f"{c}::erase({it})", f"{c}::erase({it},{it})"]),
-        "resize": ((v, -1), [f"{c}::resize({s})", f"{c}::resize({s},{vt})"]),
-        "insert": ((v, None, 1), [f"{c}::insert({it},{vt})", f"{c}::insert({it},{s},{vt})"]),
-    }
-    for member, (args, prototypes) in cases.items():
-        name = function_name(inst.prefix, member)
-        raises(TypeError, overload_text(name, *prototypes), getattr(m, name), *args)
-    raises(TypeError, inst.new_refused, inst.new, 1.5)
+    cases = {"__getitem__": (v, 1.0), "__setitem__": (v, 1.0, 1), "__delitem__": (v, None), "__setslice__": (v, 0),
+             "erase": (v, 0), "resize": (v, -1), "insert": (v, None, 1), "new": (1.5,)}
+    for member, args in cases.items():
+        raises(TypeError, inst.refused(member), inst.fn(member), *args)
     assert inst.read(v) == inst.samples
     # Self of the wrong type: another instance's vector, a plain object.
     for member, self_, text in (("pop", INSTANCES[(INSTANCES.index(inst) + 1) % 6].make(), "*"), ("empty", 3, "const *")):
-        raises(TypeError, f"in method '{inst.prefix}_{member}', argument 1 of type '{c} {text}'", inst.fn(member), self_)
+        raises(TypeError, f"in method '{inst.prefix}_{member}', argument 1 of type '{inst.container} {text}'",
+               inst.fn(member), self_)
 
 
 @by_instance
