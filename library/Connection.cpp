@@ -1,0 +1,204 @@
+// The transport of the client library.
+#include "library/Connection.h"
+
+#include <charconv>
+#include <cstring>
+
+namespace ZarvoSDKClientCPP {
+
+using client3::platform::Clock;
+using client3::platform::Io;
+using namespace client3::protocol;
+
+char const* ResultText(int code) {
+  switch (code) {
+    case ResultCode::Success: return "OK";
+    case ResultCode::NotConnected: return "Unable to communicate with the host application.";
+    case ResultCode::RequestTimedOut: return "Host application failed to respond to the information request.";
+    case ResultCode::ReplyParsingError: return "Unable to interpret information sent from the host application.";
+    case ResultCode::ApplicationError: return "Host application encountered an error processing the request.";
+    case ResultCode::InvalidFrameNumber: return "Frame number specified is invalid.";
+    case ResultCode::ConversionError: return "Unable to convert output parameter to a numeric value.";
+    case ResultCode::ExpectedOneFrame: return "Invalid number of frames returned, expected one frame.";
+    default: return "Unknown Error";
+  }
+}
+
+namespace {
+
+// The codes a reply may carry; any other is a status this library does not know.
+ResultCode::Enum Known(std::int32_t code) {
+  switch (code) {
+    case ResultCode::Success:
+    case ResultCode::NotConnected:
+    case ResultCode::RequestTimedOut:
+    case ResultCode::ReplyParsingError:
+    case ResultCode::ApplicationError:
+    case ResultCode::InvalidFrameNumber:
+    case ResultCode::ConversionError:
+    case ResultCode::ExpectedOneFrame:
+      return static_cast<ResultCode::Enum>(code);
+    default:
+      return ResultCode::UnknownStatus;
+  }
+}
+
+// "host?timeout=MS&connect=MS": the host name and the two time limits.
+struct Address {
+  std::string host = "127.0.0.1";
+  std::chrono::milliseconds connect = kConnectTimeout;
+  std::chrono::milliseconds reply = kReplyTimeout;
+};
+
+bool ParseAddress(std::string const& text, Address& out) {
+  std::size_t query = text.find('?');
+  std::string host = text.substr(0, query);
+  if (!host.empty()) out.host = host;
+  if (!out.host.empty() && out.host.front() == '[' && out.host.back() == ']') out.host = out.host.substr(1, out.host.size() - 2);
+  while (query != std::string::npos) {
+    std::size_t next = text.find('&', query + 1);
+    std::string option = text.substr(query + 1, next == std::string::npos ? std::string::npos : next - query - 1);
+    std::size_t equals = option.find('=');
+    long long ms = -1;
+    if (equals != std::string::npos) {
+      const char* first = option.data() + equals + 1;
+      const char* last = option.data() + option.size();
+      auto [end, error] = std::from_chars(first, last, ms);
+      if (error != std::errc() || end != last || ms < 0) return false;
+    }
+    std::string key = option.substr(0, equals);
+    if (key == "timeout")
+      out.reply = std::chrono::milliseconds(ms);
+    else if (key == "connect")
+      out.connect = std::chrono::milliseconds(ms);
+    else
+      return false;
+    query = next;
+  }
+  return true;
+}
+
+}  // namespace
+
+ClientConnection::Call::Call(ClientConnection& connection, Id id)
+    : lock_(connection.mutex_), connection_(connection), id_(++connection.lastId_) {
+  Writer& w = connection.request_;
+  w.Clear(Request);
+  w.Raw(id_);
+  w.Raw(static_cast<std::uint16_t>(id));
+}
+
+ResultCode::Enum ClientConnection::Lost() {
+  socket_.Close();
+  return ResultCode::NotConnected;
+}
+
+// Reads one frame into reply_.
+ResultCode::Enum ClientConnection::Receive(Clock::time_point deadline) {
+  char header[kHeaderSize];
+  Io io = socket_.ReceiveAll(header, sizeof header, deadline);
+  if (io == Io::TimedOut) return ResultCode::RequestTimedOut;
+  if (io == Io::Closed) return Lost();
+  std::uint32_t size;
+  std::memcpy(&size, header, sizeof size);
+  if (size == 0 || size > kMaxFrame) {
+    // The stream can no longer be followed.
+    socket_.Close();
+    return ResultCode::ReplyParsingError;
+  }
+  reply_.resize(size);
+  io = socket_.ReceiveAll(reply_.data(), size, deadline);
+  if (io == Io::Done) return ResultCode::Success;
+  // Half a frame: the rest can no longer be told apart from the next reply.
+  socket_.Close();
+  return io == Io::TimedOut ? ResultCode::RequestTimedOut : ResultCode::NotConnected;
+}
+
+ResultCode::Enum ClientConnection::Call::Exchange(std::string& message) {
+  ClientConnection& c = connection_;
+  if (!c.socket_.valid()) return ResultCode::NotConnected;
+  std::string_view frame = c.request_.Finish();
+  if (!c.socket_.SendAll(frame.data(), frame.size())) return c.Lost();
+  Clock::time_point deadline =
+      c.replyTimeout_.count() ? Clock::now() + c.replyTimeout_ : Clock::time_point::max();
+  for (;;) {
+    if (ResultCode::Enum code = c.Receive(deadline); code != ResultCode::Success) return code;
+    try {
+      Reader reader(c.reply_.data(), c.reply_.size());
+      auto kind = reader.Raw<char>();
+      if (kind == Refusal) {
+        message = reader.RawText();
+        c.socket_.Close();
+        return ResultCode::ApplicationError;
+      }
+      if (kind != Reply) return ResultCode::ReplyParsingError;
+      auto id = reader.Raw<std::uint32_t>();
+      // A reply to an earlier request that gave up waiting: passed over.
+      if (id < id_) continue;
+      if (id != id_) return ResultCode::ReplyParsingError;
+      auto code = reader.Raw<std::int32_t>();
+      message = reader.RawText();
+      outputsAt_ = c.reply_.size() - reader.remaining();
+      return Known(code);
+    } catch (const DecodeError&) {
+      return ResultCode::ReplyParsingError;
+    }
+  }
+}
+
+ResultCode::Enum ClientConnection::Open(std::string const& text, int port, std::string& message) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  socket_.Close();
+  Address address;
+  if (!ParseAddress(text, address)) {
+    message = "'" + text + "' is not an address of the form host?timeout=MS&connect=MS";
+    return ResultCode::NotConnected;
+  }
+  if (port <= 0) port = kDefaultPort;
+  socket_ = client3::platform::Socket::Connect(address.host, port, address.connect, message);
+  if (!socket_.valid()) return ResultCode::NotConnected;
+  replyTimeout_ = address.reply;
+
+  Writer& hello = request_;
+  hello.Clear(Hello);
+  hello.Append(kMagic, sizeof kMagic);
+  hello.Raw(kVersion);
+  hello.Raw(static_cast<std::uint16_t>(kCommandCount));
+  hello.RawText("");
+  std::string_view frame = hello.Finish();
+  if (!socket_.SendAll(frame.data(), frame.size())) return Lost();
+  ResultCode::Enum code = Receive(Clock::now() + address.connect);
+  if (code != ResultCode::Success) {
+    socket_.Close();
+    return code == ResultCode::RequestTimedOut ? ResultCode::NotConnected : code;
+  }
+  try {
+    Reader reader(reply_.data(), reply_.size());
+    auto kind = reader.Raw<char>();
+    if (kind == Refusal) {
+      message = reader.RawText();
+      socket_.Close();
+      return ResultCode::ApplicationError;
+    }
+    if (kind != Hello || reader.Raw<std::uint16_t>() != kVersion || reader.Raw<std::uint16_t>() != kCommandCount)
+      throw DecodeError("the application speaks another version of the protocol");
+  } catch (const DecodeError& error) {
+    message = error.what();
+    socket_.Close();
+    return ResultCode::ReplyParsingError;
+  }
+  message.clear();
+  return ResultCode::Success;
+}
+
+void ClientConnection::Close() {
+  std::lock_guard<std::mutex> lock(mutex_);
+  socket_.Close();
+}
+
+bool ClientConnection::Connected() const {
+  std::lock_guard<std::mutex> lock(mutex_);
+  return socket_.valid() && !socket_.PeerClosed();
+}
+
+}  // namespace ZarvoSDKClientCPP

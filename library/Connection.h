@@ -1,0 +1,65 @@
+// A client's connection to the application: one socket, request ids, the reply timeout, and the
+// exchange of one request for its reply.
+#pragma once
+
+#include <cstdint>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "platform/net.h"
+#include "protocol/wire.h"
+#include "ZarvoSDKClientCPP/ZarvoPelluxPostClient.h"
+
+namespace ZarvoSDKClientCPP {
+
+// The message of a result code.
+char const* ResultText(int code);
+
+// How long Connect waits for the application, and how long a request waits for its reply, unless
+// the address says otherwise ("host?timeout=MS&connect=MS").
+inline constexpr int kDefaultPort = 8870;
+inline constexpr std::chrono::milliseconds kConnectTimeout{5000};
+inline constexpr std::chrono::milliseconds kReplyTimeout{30000};
+
+class ClientConnection {
+public:
+  // One request under way: its frame is written between Start and Exchange, and its reply's outputs
+  // are read after. The connection stays locked for the whole exchange.
+  class Call {
+  public:
+    client3::protocol::Writer& request() { return connection_.request_; }
+    // Sends the request and waits for its reply. On Success, `outputs()` reads the reply's values;
+    // `message` is the application's text (empty when it sent none).
+    ResultCode::Enum Exchange(std::string& message);
+    client3::protocol::Reader outputs() const { return {connection_.reply_.data() + outputsAt_, connection_.reply_.size() - outputsAt_}; }
+
+  private:
+    friend class ClientConnection;
+    Call(ClientConnection& connection, client3::protocol::Id id);
+    std::lock_guard<std::mutex> lock_;
+    ClientConnection& connection_;
+    std::uint32_t id_;
+    std::size_t outputsAt_ = 0;
+  };
+
+  Call Start(client3::protocol::Id id) { return Call(*this, id); }
+
+  // Connects and shakes hands; the message tells what went wrong.
+  ResultCode::Enum Open(std::string const& address, int port, std::string& message);
+  void Close();
+  bool Connected() const;
+
+private:
+  ResultCode::Enum Receive(client3::platform::Clock::time_point deadline);
+  ResultCode::Enum Lost();
+
+  mutable std::mutex mutex_;
+  client3::platform::Socket socket_;
+  std::uint32_t lastId_ = 0;
+  std::chrono::milliseconds replyTimeout_ = kReplyTimeout;
+  client3::protocol::Writer request_;
+  std::vector<char> reply_;
+};
+
+}  // namespace ZarvoSDKClientCPP

@@ -1,0 +1,305 @@
+// Sockets, stop requests and file replacement on POSIX systems and on Windows.
+#include "platform/net.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+
+#ifdef _WIN32
+#include <winsock2.h>
+#include <ws2tcpip.h>
+#include <windows.h>
+#else
+#include <arpa/inet.h>
+#include <csignal>
+#include <fcntl.h>
+#include <netdb.h>
+#include <netinet/in.h>
+#include <netinet/tcp.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <unistd.h>
+#endif
+
+namespace client3::platform {
+
+namespace {
+
+#ifdef _WIN32
+using Length = int;
+constexpr int kSendFlags = 0;
+int LastError() { return WSAGetLastError(); }
+bool InProgress(int error) { return error == WSAEWOULDBLOCK || error == WSAEINPROGRESS; }
+bool Interrupted(int) { return false; }
+int PollOnce(pollfd* fd, int ms) { return WSAPoll(fd, 1, ms); }
+void SetBlocking(std::uintptr_t s, bool blocking) {
+  u_long nonBlocking = blocking ? 0 : 1;
+  ioctlsocket(static_cast<SOCKET>(s), FIONBIO, &nonBlocking);
+}
+// Windows sockets need the library started once per process.
+struct Startup {
+  Startup() {
+    WSADATA data;
+    WSAStartup(MAKEWORD(2, 2), &data);
+  }
+};
+void EnsureStarted() { static Startup startup; }
+#else
+using Length = socklen_t;
+#ifdef MSG_NOSIGNAL
+constexpr int kSendFlags = MSG_NOSIGNAL;  // a vanished peer is an error, not a signal
+#else
+constexpr int kSendFlags = 0;
+#endif
+int LastError() { return errno; }
+bool InProgress(int error) { return error == EINPROGRESS || error == EWOULDBLOCK; }
+bool Interrupted(int error) { return error == EINTR; }
+int PollOnce(pollfd* fd, int ms) { return ::poll(fd, 1, ms); }
+void SetBlocking(int s, bool blocking) {
+  int flags = fcntl(s, F_GETFL, 0);
+  fcntl(s, F_SETFL, blocking ? (flags & ~O_NONBLOCK) : (flags | O_NONBLOCK));
+}
+void EnsureStarted() {
+#ifdef SO_NOSIGPIPE
+#else
+  static bool ignored = (std::signal(SIGPIPE, SIG_IGN), true);
+  (void)ignored;
+#endif
+}
+#endif
+
+// Milliseconds to wait until `deadline`, bounded so that the value fits an int.
+int MillisecondsUntil(Clock::time_point deadline) {
+  if (deadline == Clock::time_point::max()) return -1;
+  auto left = std::chrono::duration_cast<std::chrono::milliseconds>(deadline - Clock::now()).count();
+  if (left <= 0) return 0;
+  return left > 1000000 ? 1000000 : static_cast<int>(left);
+}
+
+std::string Describe(int error) {
+#ifdef _WIN32
+  char text[256] = {};
+  FormatMessageA(FORMAT_MESSAGE_FROM_SYSTEM | FORMAT_MESSAGE_IGNORE_INSERTS, nullptr, static_cast<DWORD>(error), 0, text,
+                 sizeof text, nullptr);
+  std::string message(text);
+  while (!message.empty() && (message.back() == '\n' || message.back() == '\r' || message.back() == '.')) message.pop_back();
+  return message;
+#else
+  return std::strerror(error);
+#endif
+}
+
+struct Addresses {
+  addrinfo* list = nullptr;
+  ~Addresses() {
+    if (list) freeaddrinfo(list);
+  }
+};
+
+bool Resolve(const std::string& host, int port, bool passive, Addresses& out, std::string& error) {
+  addrinfo hints{};
+  hints.ai_family = AF_UNSPEC;
+  hints.ai_socktype = SOCK_STREAM;
+  hints.ai_flags = passive ? AI_PASSIVE : 0;
+  std::string service = std::to_string(port);
+  int code = getaddrinfo(host.empty() ? nullptr : host.c_str(), service.c_str(), &hints, &out.list);
+  if (code != 0) {
+    error = "cannot resolve '" + host + "'";
+    return false;
+  }
+  return true;
+}
+
+}  // namespace
+
+Socket Socket::Connect(const std::string& host, int port, Clock::duration timeout, std::string& error) {
+  EnsureStarted();
+  Addresses addresses;
+  if (!Resolve(host, port, false, addresses, error)) return {};
+  Clock::time_point deadline = Clock::now() + timeout;
+  error = "no address for '" + host + "'";
+  for (addrinfo* a = addresses.list; a; a = a->ai_next) {
+    Socket s(static_cast<Handle>(::socket(a->ai_family, a->ai_socktype, a->ai_protocol)));
+    if (!s.valid()) continue;
+    SetBlocking(s.handle_, false);
+    int code = ::connect(s.handle_, a->ai_addr, static_cast<Length>(a->ai_addrlen));
+    if (code != 0 && InProgress(LastError())) {
+      if (!s.Wait(true, deadline)) {
+        error = "no answer from " + host + ":" + std::to_string(port) + " in time";
+        continue;
+      }
+      int failure = 0;
+      Length size = sizeof failure;
+      getsockopt(s.handle_, SOL_SOCKET, SO_ERROR, reinterpret_cast<char*>(&failure), &size);
+      code = failure == 0 ? 0 : -1;
+      if (failure) error = Describe(failure);
+    } else if (code != 0) {
+      error = Describe(LastError());
+    }
+    if (code != 0) continue;
+    SetBlocking(s.handle_, true);
+    int one = 1;
+    setsockopt(s.handle_, IPPROTO_TCP, TCP_NODELAY, reinterpret_cast<const char*>(&one), sizeof one);
+#ifdef SO_NOSIGPIPE
+    setsockopt(s.handle_, SOL_SOCKET, SO_NOSIGPIPE, &one, sizeof one);
+#endif
+    error.clear();
+    return s;
+  }
+  return {};
+}
+
+Socket Socket::Listen(const std::string& host, int port, std::string& error) {
+  EnsureStarted();
+  Addresses addresses;
+  if (!Resolve(host, port, true, addresses, error)) return {};
+  for (addrinfo* a = addresses.list; a; a = a->ai_next) {
+    Socket s(static_cast<Handle>(::socket(a->ai_family, a->ai_socktype, a->ai_protocol)));
+    if (!s.valid()) continue;
+#ifndef _WIN32
+    int one = 1;
+    setsockopt(s.handle_, SOL_SOCKET, SO_REUSEADDR, &one, sizeof one);
+#endif
+    if (::bind(s.handle_, a->ai_addr, static_cast<Length>(a->ai_addrlen)) != 0 || ::listen(s.handle_, 64) != 0) {
+      error = Describe(LastError());
+      continue;
+    }
+    error.clear();
+    return s;
+  }
+  if (error.empty()) error = "no address to listen on";
+  return {};
+}
+
+int Socket::LocalPort() const {
+  sockaddr_storage address{};
+  Length size = sizeof address;
+  if (getsockname(handle_, reinterpret_cast<sockaddr*>(&address), &size) != 0) return -1;
+  if (address.ss_family == AF_INET6) return ntohs(reinterpret_cast<sockaddr_in6*>(&address)->sin6_port);
+  return ntohs(reinterpret_cast<sockaddr_in*>(&address)->sin_port);
+}
+
+Socket Socket::Accept(Clock::duration timeout) {
+  if (!Wait(false, Clock::now() + timeout)) return {};
+  Socket s(static_cast<Handle>(::accept(handle_, nullptr, nullptr)));
+  if (s.valid()) {
+    int one = 1;
+    setsockopt(s.handle_, IPPROTO_TCP, TCP_NODELAY, reinterpret_cast<const char*>(&one), sizeof one);
+#ifdef SO_NOSIGPIPE
+    setsockopt(s.handle_, SOL_SOCKET, SO_NOSIGPIPE, &one, sizeof one);
+#endif
+  }
+  return s;
+}
+
+bool Socket::Wait(bool write, Clock::time_point deadline) const {
+  for (;;) {
+    pollfd fd{};
+    fd.fd = handle_;
+    fd.events = write ? POLLOUT : POLLIN;
+    int ready = PollOnce(&fd, MillisecondsUntil(deadline));
+    if (ready > 0) return true;
+    if (ready == 0 && MillisecondsUntil(deadline) == 0) return false;
+    if (ready < 0 && !Interrupted(LastError())) return true;  // the next call on the socket reports it
+  }
+}
+
+bool Socket::SendAll(const char* data, std::size_t size) {
+  while (size > 0) {
+    int chunk = size > (1u << 30) ? (1 << 30) : static_cast<int>(size);
+    auto sent = ::send(handle_, data, chunk, kSendFlags);
+    if (sent <= 0) {
+      if (sent < 0 && Interrupted(LastError())) continue;
+      return false;
+    }
+    data += sent;
+    size -= static_cast<std::size_t>(sent);
+  }
+  return true;
+}
+
+Io Socket::ReceiveAll(char* data, std::size_t size, Clock::time_point deadline) {
+  while (size > 0) {
+    if (deadline != Clock::time_point::max() && !Wait(false, deadline)) return Io::TimedOut;
+    int chunk = size > (1u << 30) ? (1 << 30) : static_cast<int>(size);
+    auto got = ::recv(handle_, data, chunk, 0);
+    if (got <= 0) {
+      if (got < 0 && Interrupted(LastError())) continue;
+      return Io::Closed;
+    }
+    data += got;
+    size -= static_cast<std::size_t>(got);
+  }
+  return Io::Done;
+}
+
+bool Socket::PeerClosed() const {
+  if (!valid()) return true;
+  pollfd fd{};
+  fd.fd = handle_;
+  fd.events = POLLIN;
+  if (PollOnce(&fd, 0) <= 0) return false;
+  if (fd.revents & (POLLERR | POLLHUP | POLLNVAL)) return true;
+  char byte;
+#ifdef _WIN32
+  return ::recv(handle_, &byte, 1, MSG_PEEK) <= 0;
+#else
+  return ::recv(handle_, &byte, 1, MSG_PEEK | MSG_DONTWAIT) == 0;
+#endif
+}
+
+void Socket::Shutdown() {
+  if (!valid()) return;
+#ifdef _WIN32
+  ::shutdown(handle_, SD_BOTH);
+#else
+  ::shutdown(handle_, SHUT_RDWR);
+#endif
+}
+
+void Socket::Close() {
+  if (!valid()) return;
+#ifdef _WIN32
+  ::closesocket(handle_);
+#else
+  ::close(handle_);
+#endif
+  handle_ = kInvalid;
+}
+
+namespace {
+void (*stopHandler)() = nullptr;
+#ifdef _WIN32
+BOOL WINAPI ConsoleEvent(DWORD) {
+  if (stopHandler) stopHandler();
+  return TRUE;
+}
+#else
+void StopSignal(int) {
+  if (stopHandler) stopHandler();
+}
+#endif
+}  // namespace
+
+void OnStopRequest(void (*stop)()) {
+  stopHandler = stop;
+#ifdef _WIN32
+  SetConsoleCtrlHandler(ConsoleEvent, TRUE);
+#else
+  struct sigaction action {};
+  action.sa_handler = StopSignal;
+  sigemptyset(&action.sa_mask);
+  sigaction(SIGINT, &action, nullptr);
+  sigaction(SIGTERM, &action, nullptr);
+#endif
+}
+
+bool ReplaceFile(const std::string& temporary, const std::string& path) {
+#ifdef _WIN32
+  return MoveFileExA(temporary.c_str(), path.c_str(), MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH) != 0;
+#else
+  return std::rename(temporary.c_str(), path.c_str()) == 0;
+#endif
+}
+
+}  // namespace client3::platform
