@@ -1,0 +1,95 @@
+// client3-host: the post-processing application, serving one scene to its clients.
+//
+//   client3-host [--host 127.0.0.1] [--port 8870] [--scene demo|empty|FILE] [--frames 1000]
+//
+// The first line on standard output is "listening on HOST:PORT" (with --port 0, the port the system
+// picked). The log goes to standard error. SIGINT and SIGTERM stop it cleanly.
+#include <atomic>
+#include <charconv>
+#include <cstdio>
+#include <cstring>
+#include <string>
+#include <string_view>
+
+#include "host/server.h"
+#include "platform/net.h"
+
+using namespace client3::host;
+
+namespace {
+
+std::atomic<bool> stopRequested{false};
+void RequestStop() { stopRequested = true; }
+
+bool ParseInt(std::string_view text, int& out, int least, int most) {
+  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), out);
+  return error == std::errc() && end == text.data() + text.size() && out >= least && out <= most;
+}
+
+// KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, frames=N.
+bool ParseFault(std::string_view spec, Options& options) {
+  std::string command;
+  if (auto at = spec.find('@'); at != std::string_view::npos) command = spec.substr(at + 1), spec = spec.substr(0, at);
+  std::string_view kind = spec.substr(0, spec.find('='));
+  std::string_view value = kind.size() < spec.size() ? spec.substr(kind.size() + 1) : std::string_view();
+  int number = 0;
+  if (!value.empty() && !ParseInt(value, number, -2147483647, 2147483647)) return false;
+  if (kind == "frames") return number >= 0 && (options.faults.framesPerFrame = number, true);
+  static const std::pair<std::string_view, ReplyFault::Kind> kinds[] = {
+      {"delay", ReplyFault::Delay}, {"garbage", ReplyFault::Garbage}, {"close", ReplyFault::Close},
+      {"text", ReplyFault::Text},   {"status", ReplyFault::Status},   {"oversize", ReplyFault::Oversize}};
+  for (auto [name, k] : kinds)
+    if (kind == name) return options.replyFaults.push_back({k, number, command}), true;
+  return false;
+}
+
+int Usage(const char* problem) {
+  if (problem) std::fprintf(stderr, "client3-host: %s\n", problem);
+  std::fprintf(problem ? stderr : stdout,
+               "usage: client3-host [--host ADDRESS] [--port N] [--scene demo|empty|FILE] [--frames N]\n"
+               "  --host ADDRESS   the address to listen on (default 127.0.0.1)\n"
+               "  --port N         the port (default 8870; 0 picks a free one)\n"
+               "  --scene SCENE    demo (default), empty, or a scene file\n"
+               "  --frames N       frames of the demo and empty scenes, 1 to 1000000 (default 1000)\n"
+               "  --max-clients N  clients served at once (default 64)\n"
+               "  --fault SPEC     test only: misbehave as SPEC says (see the reference page)\n");
+  return problem ? 2 : 0;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  Options options;
+  for (int i = 1; i < argc; ++i) {
+    std::string_view option = argv[i];
+    if (option == "--help" || option == "-h") return Usage(nullptr);
+    if (i + 1 >= argc) return Usage(("option " + std::string(option) + " needs a value").c_str());
+    std::string_view value = argv[++i];
+    int maxClients = 0;
+    if (option == "--host")
+      options.host = value;
+    else if (option == "--port") {
+      if (!ParseInt(value, options.port, 0, 65535)) return Usage("--port takes a number from 0 to 65535");
+    } else if (option == "--scene")
+      options.scene = value;
+    else if (option == "--frames") {
+      if (!ParseInt(value, options.frames, 1, 1000000)) return Usage("--frames takes a number from 1 to 1000000");
+    } else if (option == "--max-clients") {
+      if (!ParseInt(value, maxClients, 1, 4096)) return Usage("--max-clients takes a number from 1 to 4096");
+      options.maxClients = static_cast<std::size_t>(maxClients);
+    } else if (option == "--fault") {
+      if (!ParseFault(value, options)) return Usage(("unknown fault '" + std::string(value) + "'").c_str());
+    } else {
+      return Usage(("unknown option " + std::string(option)).c_str());
+    }
+  }
+  Scene scene;
+  if (options.scene == "demo")
+    scene = DemoScene(options.frames);
+  else if (options.scene == "empty")
+    scene = EmptyScene(options.frames);
+  else
+    return Usage("scene files cannot be opened by this version of the application");
+  client3::platform::OnStopRequest(RequestStop);
+  return Serve(options, scene, stopRequested);
+}

@@ -1,0 +1,246 @@
+// Connections, frames and the dispatch of commands.
+#include "host/server.h"
+
+#include <cstdio>
+#include <cstring>
+#include <list>
+#include <memory>
+#include <mutex>
+#include <thread>
+
+#include "platform/net.h"
+
+namespace client3::host {
+
+using platform::Clock;
+using platform::Io;
+using platform::Socket;
+using protocol::CommandOf;
+using protocol::DecodeError;
+using protocol::Id;
+using protocol::Reader;
+using protocol::Writer;
+
+namespace {
+
+// A client has this long to say hello after connecting.
+constexpr auto kHelloTime = std::chrono::seconds(10);
+
+struct Shared {
+  Scene& scene;
+  std::mutex sceneLock;  // every command runs whole while it holds the scene
+  const Options& options;
+};
+
+struct Client {
+  Socket socket;
+  std::thread thread;
+  std::atomic<bool> done{false};
+};
+
+enum class Got { Frame, Closed, TooLarge };
+
+Got ReadFrame(Socket& socket, std::vector<char>& payload, Clock::time_point deadline) {
+  char header[protocol::kHeaderSize];
+  if (socket.ReceiveAll(header, sizeof header, deadline) != Io::Done) return Got::Closed;
+  std::uint32_t size;
+  std::memcpy(&size, header, sizeof size);
+  if (size == 0 || size > protocol::kMaxFrame) return Got::TooLarge;
+  payload.resize(size);
+  return socket.ReceiveAll(payload.data(), size, deadline) == Io::Done ? Got::Frame : Got::Closed;
+}
+
+void Send(Socket& socket, Writer& frame) {
+  std::string_view bytes = frame.Finish();
+  socket.SendAll(bytes.data(), bytes.size());
+}
+
+void SendRefusal(Socket& socket, std::string_view message) {
+  Writer frame(protocol::Refusal);
+  frame.RawText(message);
+  Send(socket, frame);
+}
+
+bool Handshake(Socket& socket) {
+  std::vector<char> payload;
+  if (ReadFrame(socket, payload, Clock::now() + kHelloTime) != Got::Frame) return false;
+  try {
+    Reader hello(payload.data(), payload.size());
+    char magic[sizeof protocol::kMagic];
+    if (hello.Raw<char>() != protocol::Hello) throw DecodeError("");
+    for (char& c : magic) c = hello.Raw<char>();
+    if (std::memcmp(magic, protocol::kMagic, sizeof magic) != 0) throw DecodeError("");
+    auto version = hello.Raw<std::uint16_t>();
+    auto count = hello.Raw<std::uint16_t>();
+    hello.RawText();  // the access token, for hosts that ask for one
+    if (version != protocol::kVersion || count != protocol::kCommandCount) {
+      SendRefusal(socket, "this application speaks version " + std::to_string(protocol::kVersion) + " of the protocol with " +
+                              std::to_string(protocol::kCommandCount) + " commands");
+      return false;
+    }
+  } catch (const DecodeError&) {
+    SendRefusal(socket, "this is not a client of the application");
+    return false;
+  }
+  Writer reply(protocol::Hello);
+  reply.Raw(protocol::kVersion);
+  reply.Raw(static_cast<std::uint16_t>(protocol::kCommandCount));
+  Send(socket, reply);
+  return true;
+}
+
+const ReplyFault* FaultFor(const Options& options, Id id) {
+  for (const ReplyFault& fault : options.replyFaults)
+    if (fault.command.empty() || fault.command == CommandOf(id).name) return &fault;
+  return nullptr;
+}
+
+// Rewrites a successful reply so that its numeric scalars come as texts that are no numbers.
+void NumbersAsText(Writer& reply, std::size_t outputsAt, Id id) {
+  std::string_view frame = reply.Finish();
+  std::string copy(frame.substr(protocol::kHeaderSize));
+  Reader outputs(copy.data() + outputsAt, copy.size() - outputsAt);
+  Writer rewritten;
+  rewritten.Append(copy.data(), outputsAt);
+  for (const protocol::Param& p : CommandOf(id).out) {
+    const char* at = outputs.position();
+    outputs.Skip(p.type);
+    if (protocol::FixedSize(p.type))
+      rewritten.Put("not a number");
+    else
+      rewritten.Append(at, static_cast<std::size_t>(outputs.position() - at));
+  }
+  reply = std::move(rewritten);
+}
+
+// Sends a reply, or misbehaves as a fault says.
+bool SendReply(Socket& socket, Writer& reply, const ReplyFault* fault) {
+  if (!fault) return Send(socket, reply), true;
+  switch (fault->kind) {
+    case ReplyFault::Delay:
+      std::this_thread::sleep_for(std::chrono::milliseconds(fault->value));
+      break;
+    case ReplyFault::Garbage:
+      reply.Clear(static_cast<protocol::Kind>('?'));
+      reply.Append("garbage", 7);
+      break;
+    case ReplyFault::Close: {
+      std::string_view bytes = reply.Finish();
+      socket.SendAll(bytes.data(), bytes.size() / 2);
+      return false;
+    }
+    case ReplyFault::Oversize: {
+      std::uint32_t size = protocol::kMaxFrame + 1;
+      socket.SendAll(reinterpret_cast<const char*>(&size), sizeof size);
+      return false;
+    }
+    default:
+      break;
+  }
+  Send(socket, reply);
+  return true;
+}
+
+void ServeClient(Shared& shared, Client& client) {
+  Socket& socket = client.socket;
+  std::string language = "en";
+  Context context{shared.scene, language, shared.options.faults};
+  std::vector<char> payload;
+  Writer reply;
+  if (Handshake(socket)) {
+    for (;;) {
+      Got got = ReadFrame(socket, payload, Clock::time_point::max());
+      if (got == Got::TooLarge) {
+        SendRefusal(socket, "a frame may hold at most " + std::to_string(protocol::kMaxFrame) + " bytes");
+        break;
+      }
+      if (got == Got::Closed) break;
+      std::uint32_t requestId;
+      std::uint16_t command;
+      Reader in(payload.data(), payload.size());
+      try {
+        if (in.Raw<char>() != protocol::Request) throw DecodeError("");
+        requestId = in.Raw<std::uint32_t>();
+        command = in.Raw<std::uint16_t>();
+      } catch (const DecodeError&) {
+        SendRefusal(socket, "a frame that is not a request");
+        break;
+      }
+      auto id = static_cast<Id>(command);
+      auto header = [&](Status status, std::string_view message) {
+        reply.Clear(protocol::Reply);
+        reply.Raw(requestId);
+        reply.Raw(static_cast<std::int32_t>(status));
+        reply.RawText(message);
+      };
+      bool ok = false;
+      header(Ok, "");
+      std::size_t outputsAt = reply.size() - protocol::kHeaderSize;
+      try {
+        if (command >= protocol::kCommandCount) Refuse("no command number " + std::to_string(command));
+        try {
+          protocol::Validate(in, CommandOf(id).in);
+        } catch (const DecodeError& error) {
+          Refuse("the request for '" + std::string(CommandOf(id).name) + "' does not match the command: " + error.what());
+        }
+        std::lock_guard<std::mutex> lock(shared.sceneLock);
+        Run(id, context, in, reply);
+        ok = true;
+      } catch (const Failure& failure) {
+        header(failure.status, failure.message);
+      } catch (const std::bad_alloc&) {
+        header(Refused, "the application ran out of memory for this request");
+      } catch (const std::exception& error) {
+        header(Refused, error.what());
+      }
+      const ReplyFault* fault = command < protocol::kCommandCount ? FaultFor(shared.options, id) : nullptr;
+      if (ok && fault && fault->kind == ReplyFault::Text)
+        NumbersAsText(reply, outputsAt, id);
+      if (fault && fault->kind == ReplyFault::Status) header(static_cast<Status>(fault->value), "");
+      if (!SendReply(socket, reply, fault)) break;
+    }
+  }
+  socket.Shutdown();
+  client.done = true;
+}
+
+}  // namespace
+
+int Serve(const Options& options, Scene& scene, const std::atomic<bool>& stop) {
+  std::string error;
+  Socket listener = Socket::Listen(options.host, options.port, error);
+  if (!listener.valid()) {
+    std::fprintf(stderr, "cannot listen on %s port %d: %s\n", options.host.c_str(), options.port, error.c_str());
+    return 1;
+  }
+  bool v6 = options.host.find(':') != std::string::npos;
+  std::printf("listening on %s%s%s:%d\n", v6 ? "[" : "", options.host.c_str(), v6 ? "]" : "", listener.LocalPort());
+  std::fflush(stdout);
+  LogLine("info", "serving scene '" + scene.name + "' of " + std::to_string(scene.frames) + " frames");
+
+  Shared shared{scene, {}, options};
+  std::list<Client> clients;
+  while (!stop) {
+    Socket socket = listener.Accept(std::chrono::milliseconds(100));
+    clients.remove_if([](Client& c) {
+      if (!c.done) return false;
+      c.thread.join();
+      return true;
+    });
+    if (!socket.valid()) continue;
+    if (clients.size() >= options.maxClients) {
+      SendRefusal(socket, "the application serves at most " + std::to_string(options.maxClients) + " clients at once");
+      continue;
+    }
+    Client& client = clients.emplace_back();
+    client.socket = std::move(socket);
+    client.thread = std::thread(ServeClient, std::ref(shared), std::ref(client));
+  }
+  listener.Close();
+  for (Client& c : clients) c.socket.Shutdown();
+  for (Client& c : clients) c.thread.join();
+  LogLine("info", "stopped");
+  return 0;
+}
+
+}  // namespace client3::host
