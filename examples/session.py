@@ -1,92 +1,108 @@
-"""A first session with the application: connect, and print an account of the scene.
+"""A first session with the application: an account of the scene and a plot of one marker.
 
-    python examples/session.py                 # starts its own application on a free port
-    python examples/session.py HOST PORT       # uses a running one
+    python examples/session.py                  # starts its own application on a free port
+    python examples/session.py HOST PORT        # uses a running one
+    python examples/session.py --plot out.png --subject Bob --marker LKNE
 
-Every operation answers with a record whose Result is 0 (Success) or a code whose text
-ToString gives; failures inside the application are reported there, never raised.
+The plot (session.png by default) shows the marker's x, y and z over time with its gaps shaded.
 """
-import subprocess
-import sys
+from __future__ import annotations
 
-import _Client3 as m
+import argparse
+import contextlib
+from typing import Iterator, List, Sequence, Tuple
 
+import matplotlib
 
-def register_classes():
-    """Gives every wrapped class a script class that frees what its proxies own."""
-    for name in dir(m):
-        if name.endswith("_swigregister"):
-            cls = name[: -len("_swigregister")]
-            destroy = getattr(m, "delete_" + cls, None)
-            getattr(m, name)(type(cls, (), {"__swig_destroy__": destroy} if destroy else {}))
+matplotlib.use("Agg")
+import matplotlib.pyplot as plt  # noqa: E402
 
+import Client3  # noqa: E402
+from Client3.testing import running_host  # noqa: E402
 
-def text(safe_string):
-    return m.SafeString_Value(safe_string)
+FRAME_RATE = 100.0  # frames per second of the demo scene; the application has no frame-rate command yet
 
 
-def strings(vector):
-    return [text(m.vectorss___getitem__(vector, i)) for i in range(m.vectorss___len__(vector))]
+def gaps(seen: Sequence[bool]) -> List[Tuple[int, int]]:
+    """The runs of frames where the marker is not seen, as (first, last) frame numbers."""
+    runs: List[Tuple[int, int]] = []
+    for index, visible in enumerate(seen):
+        frame = index + 1
+        if visible:
+            continue
+        if runs and runs[-1][1] == frame - 1:
+            runs[-1] = (runs[-1][0], frame)
+        else:
+            runs.append((frame, frame))
+    return runs
 
 
-def check(record):
-    """Stops the session with the application's message when a call failed."""
-    code = m.Output_Result_Result_get(record)
-    if code != m.Success:
-        sys.exit(f"failed ({code}): {text(m.Output_Result_ResultString_get(record))}")
-    return record
+@contextlib.contextmanager
+def application(address: str, port: int) -> Iterator[Tuple[str, int]]:
+    """The given application, or one of our own when no port is given."""
+    if port:
+        yield address, port
+    else:
+        with running_host(log=False) as host:
+            yield host.address, host.port
 
 
-def start_host():
-    """Starts the application on a free loopback port; returns the process and its port."""
-    host = subprocess.Popen(["client3-host", "--port", "0"], stdout=subprocess.PIPE, stderr=subprocess.DEVNULL, text=True)
-    first = host.stdout.readline()  # "listening on 127.0.0.1:PORT"
-    return host, int(first.rsplit(":", 1)[1])
-
-
-def account(client):
-    info = check(m.ZarvoPelluxPostClient_PSL(client, "GetServerInfo"))
-    server = dict(line.split("=", 1) for line in text(m.Output_GetString_Str_get(info)).splitlines())
+def account(client: Client3.ZarvoPelluxPostClient) -> None:
+    info = client.PSL("GetServerInfo").check()
+    server = dict(line.split("=", 1) for line in str(info.Str).splitlines())
     print(f"{server['Program']} {server['MajorVersion']}.{server['MinorVersion']}.{server['PointVersion']}")
 
-    scene = check(m.ZarvoPelluxPostClient_GetSceneName(client))
-    frames = m.ZarvoPelluxPostClient_GetFrameCount(client)
-    print(f"scene '{text(m.Output_GetSceneName_Name_get(scene))}', frames 1 to {frames}")
+    frames = client.GetFrameCount()
+    scene = client.GetSceneName().check()
+    print(f"scene '{scene.Name}', frames 1 to {frames} at {FRAME_RATE:g} Hz ({frames / FRAME_RATE:g} s)")
 
-    subjects = check(m.ZarvoPelluxPostClient_GetSubjectNames(client))
-    for subject in strings(m.Output_GetSubjectNames_Names_get(subjects)):
-        markers = check(m.ZarvoPelluxPostClient_GetMarkerNames(client, subject))
+    subjects = client.GetSubjectNames().check()
+    for subject in subjects.Names:
         print(f"subject {subject}:")
-        for marker in strings(m.Output_GetMarkerNames_Names_get(markers)):
-            trajectory = check(m.ZarvoPelluxPostClient_GetTrajectory(client, subject, marker))
-            seen = m.Output_GetTrajectory_E_get(trajectory)
-            flags = [m.vectorb___getitem__(seen, i) for i in range(m.vectorb___len__(seen))]
-            gaps = sum(1 for i, e in enumerate(flags) if not e and (i == 0 or flags[i - 1]))
-            print(f"  {marker:<6} seen in {sum(flags):5d} frames, {gaps} gap(s)")
-
-    trajectory = check(m.ZarvoPelluxPostClient_GetTrajectory(client, "Alice", "LANK"))
-    x = m.Output_GetTrajectory_X_get(trajectory)
-    print(f"Alice's LANK travels from x = {m.vectord_front(x):.0f} mm to x = {m.vectord_back(x):.0f} mm")
+        for marker in client.GetMarkerNames(str(subject)).check().Names:
+            seen = list(client.GetTrajectory(str(subject), str(marker)).check().E)
+            print(f"  {marker!s:<6} seen in {sum(seen):5d} frames, {len(gaps(seen))} gap(s)")
 
 
-def main(argv):
-    register_classes()
-    host = None
-    if len(argv) == 3:
-        address, port = argv[1], int(argv[2])
-    else:
-        host, port = start_host()
-        address = "127.0.0.1"
-    client = m.new_ZarvoPelluxPostClient()
-    try:
-        check(m.ZarvoPelluxPostClient_Connect(client, address, port))
-        account(client)
-    finally:
-        m.delete_ZarvoPelluxPostClient(client)
-        if host:
-            host.terminate()
-            host.wait()
+def plot(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str, path: str) -> None:
+    trajectory = client.GetTrajectory(subject, marker).check()
+    seen = list(trajectory.E)
+    seconds = [index / FRAME_RATE for index in range(len(seen))]
+    x = list(trajectory.X)
+    print(f"{subject}'s {marker} travels from x = {x[0]:.0f} mm to x = {x[-1]:.0f} mm")
+
+    figure, axes = plt.subplots(figsize=(10, 4))
+    for name, values in (("x", x), ("y", list(trajectory.Y)), ("z", list(trajectory.Z))):
+        shown = [value if visible else float("nan") for value, visible in zip(values, seen)]
+        axes.plot(seconds, shown, label=name)
+    for number, (first, last) in enumerate(gaps(seen)):
+        axes.axvspan((first - 1) / FRAME_RATE, last / FRAME_RATE, color="red", alpha=0.2, label="gap" if number == 0 else None)
+    axes.set_xlabel("time (s)")
+    axes.set_ylabel("position (mm)")
+    axes.set_title(f"{subject} {marker}")
+    axes.legend(loc="upper left")
+    figure.tight_layout()
+    figure.savefig(path)
+    plt.close(figure)
+    print(f"plot of {subject}'s {marker} written to {path}")
+
+
+def main() -> None:
+    parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
+    parser.add_argument("address", nargs="?", default="127.0.0.1")
+    parser.add_argument("port", nargs="?", type=int, default=0, help="the application's port; none starts one")
+    parser.add_argument("--plot", default="session.png", help="where to write the plot (PNG)")
+    parser.add_argument("--subject", default="Alice")
+    parser.add_argument("--marker", default="RWRA")
+    options = parser.parse_args()
+    with application(options.address, options.port) as (address, port):
+        with Client3.connect(address, port) as client:
+            account(client)
+            plot(client, options.subject, options.marker, options.plot)
 
 
 if __name__ == "__main__":
-    main(sys.argv)
+    try:
+        main()
+    except Client3.Error as error:
+        raise SystemExit(f"failed: {error}")

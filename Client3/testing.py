@@ -1,0 +1,82 @@
+"""Starting and stopping the application for tests of post-processing scripts.
+
+    from Client3.testing import running_host
+
+    with running_host(scene="demo", frames=500) as host:
+        with Client3.connect(host.address, host.port) as client:
+            ...
+
+For pytest, name this module in a conftest.py (`pytest_plugins = ["Client3.testing"]`) and ask for
+the `client3_host` fixture (a demo scene per test) or `client3_client` (a client connected to it).
+"""
+from __future__ import annotations
+
+import subprocess
+from contextlib import contextmanager
+from typing import Any, Iterator, NamedTuple, Optional, Sequence
+
+import Client3
+from Client3.host import executable
+
+STARTUP_SECONDS = 30
+STOP_SECONDS = 10
+
+
+class Host(NamedTuple):
+    """A running application: where it listens and its process."""
+
+    address: str
+    port: int
+    process: "subprocess.Popen[str]"
+
+
+def _port(first_line: str) -> int:
+    prefix = "listening on "
+    if not first_line.startswith(prefix):
+        raise RuntimeError(f"the application did not start: {first_line!r}")
+    return int(first_line.rsplit(":", 1)[1])
+
+
+@contextmanager
+def running_host(
+    scene: str = "demo", frames: Optional[int] = None, extra: Sequence[str] = (), address: str = "127.0.0.1",
+    log: bool = True,
+) -> Iterator[Host]:
+    """Starts the application on a free loopback port with the given scene and take length, and
+    stops it on exit. Its log goes to standard error, or nowhere when `log` is false."""
+    command = [executable(), "--host", address, "--port", "0", "--scene", scene, *extra]
+    if frames is not None:
+        command += ["--frames", str(frames)]
+    process = subprocess.Popen(command, stdout=subprocess.PIPE, stderr=None if log else subprocess.DEVNULL, text=True)
+    try:
+        assert process.stdout is not None
+        first = process.stdout.readline()
+        yield Host(address, _port(first), process)
+    finally:
+        process.terminate()
+        try:
+            process.wait(STOP_SECONDS)
+        except subprocess.TimeoutExpired:
+            process.kill()
+            process.wait()
+        if process.stdout is not None:
+            process.stdout.close()
+
+
+try:
+    import pytest
+except ImportError:  # pytest is needed only for the fixtures
+    pass
+else:
+
+    @pytest.fixture
+    def client3_host() -> Iterator[Host]:
+        """A demo scene of its own for each test."""
+        with running_host() as host:
+            yield host
+
+    @pytest.fixture
+    def client3_client(client3_host: Host) -> Iterator[Any]:
+        """A client connected to the test's own application; disconnected after the test."""
+        with Client3.connect(client3_host.address, client3_host.port) as client:
+            yield client
