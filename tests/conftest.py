@@ -7,6 +7,7 @@ import pytest
 sys.path.insert(0, os.path.dirname(__file__))
 
 import companion  # noqa: E402
+import hostproc  # noqa: E402
 from peer import build  # noqa: E402
 
 
@@ -20,6 +21,36 @@ def registered_classes():
 def peer(tmp_path_factory):
     """The test-only second module of the family: it looks inside the runtime and makes objects as the library does."""
     return build.peer(tmp_path_factory.mktemp("peer"))
+
+
+@pytest.fixture(scope="session")
+def host(tmp_path_factory):
+    """The demo application shared by the whole session, on a port of its own. Tests read from it;
+    a test that changes the scene starts its own with `start_host`."""
+    try:
+        started = hostproc.start(log_path=tmp_path_factory.mktemp("host") / "host.log")
+    except RuntimeError as error:
+        pytest.fail(str(error))
+    yield started
+    started.stop()
+
+
+@pytest.fixture
+def start_host(tmp_path):
+    """Starts applications with extra options (`start_host("--fault", "garbage")`); each is stopped
+    when the test ends. Their logs are host0.log, host1.log, ... in the test's tmp_path."""
+    started = []
+
+    def start(*options):
+        try:
+            started.append(hostproc.start(*options, log_path=tmp_path / f"host{len(started)}.log"))
+        except RuntimeError as error:
+            pytest.fail(str(error))
+        return started[-1]
+
+    yield start
+    for each in started:
+        each.stop()
 
 
 @pytest.fixture
