@@ -201,9 +201,14 @@ class _Vector(_Proxy, collections.abc.MutableSequence):  # type: ignore[type-arg
     def pop(self, index: int = -1) -> Any:
         if index == -1:
             return _functions[self._name + "_pop"](self)
-        value = self[index]
-        del self[index]
-        return value
+        self[index]  # IndexError when there is no such element
+        position = index % len(self)
+        piece = self[position : position + 1]  # a copy: an element read by index points into the vector
+        del self[position]
+        return piece.pop()
+
+    def reverse(self) -> None:
+        self[:] = self[::-1]
 
     def __eq__(self, other: object) -> bool:
         if isinstance(other, (_Vector, list)):

@@ -1,0 +1,265 @@
+"""The Client3 package: classes over every registered type, vectors as sequences, records, the
+client as a context manager, Client3.Error, the host launcher and the testing helpers."""
+import collections.abc
+import os
+import subprocess
+import sys
+
+import pytest
+
+import _Client3
+import Client3
+from Client3.testing import running_host
+from conftest import run_python
+
+ROOT = os.path.dirname(os.path.dirname(os.path.abspath(__file__)))
+
+
+@pytest.fixture(autouse=True)
+def client3_classes(registered_classes):
+    """Client3's classes for the test; the suite's own stand-in classes put back after it."""
+    Client3.register()
+    yield
+    for name, cls in registered_classes.items():
+        getattr(_Client3, name + "_swigregister")(cls)
+
+
+@pytest.fixture(scope="module")
+def host():
+    with running_host(log=False) as running:
+        yield running
+
+
+@pytest.fixture
+def client(host):
+    with Client3.connect(host.address, host.port) as connected:
+        yield connected
+
+
+def test_every_registered_type_has_a_class():
+    registered = {name[: -len("_swigregister")] for name in vars(_Client3) if name.endswith("_swigregister")}
+    assert set(Client3.classes) == registered
+    assert len(registered) == 46
+
+
+@pytest.mark.parametrize("name", sorted(Client3.TABLE))
+def test_class_members_are_the_module_functions(name):
+    cls = Client3.classes[name]
+    members = Client3.TABLE[name]
+    for method in members.methods:
+        assert callable(getattr(cls, method))
+    for field in members.fields:
+        assert isinstance(getattr(cls, field), property)
+    assert (getattr(cls, "__swig_destroy__", None) is getattr(_Client3, "delete_" + name, None)) == members.destructible
+
+
+def test_records_derive_from_output_result():
+    records = [cls for name, cls in Client3.classes.items() if name.startswith("Output_")]
+    assert len(records) == 36
+    assert all(issubclass(cls, Client3.Output_Result) for cls in records)
+
+
+def test_registration_happens_once_at_import():
+    code = (
+        "import _Client3, collections\n"
+        "calls = collections.Counter()\n"
+        "for name in [n for n in vars(_Client3) if n.endswith('_swigregister')]:\n"
+        "    original = getattr(_Client3, name)\n"
+        "    setattr(_Client3, name, lambda cls, o=original, n=name: (calls.update([n]), o(cls))[1])\n"
+        "import Client3, importlib\n"
+        "print(len(calls), max(calls.values()))\n"
+    )
+    status, out, err = run_python(code)
+    assert status == 0, err
+    assert out.split() == ["46", "1"]
+
+
+@pytest.mark.parametrize("name", [n for n, m in Client3.TABLE.items() if m.constructible and n not in Client3.VECTORS])
+def test_constructed_objects_are_instances_and_are_destroyed_without_a_leak(name):
+    code = f"import Client3\nobject = Client3.{name}()\nprint(type(object).__name__, object.this.own())\ndel object\nprint('gone')\n"
+    status, out, err = run_python(code)
+    assert status == 0, err
+    assert out.split() == [name, "True", "gone"]
+
+
+def test_types_without_a_constructor_refuse_construction():
+    with pytest.raises(TypeError):
+        Client3.Output_GetTrajectory()
+
+
+SAMPLES = {
+    "vectorb": [True, False, True, True, False],
+    "vectord": [1.5, -2.25, 3.0, 4.5, 0.0],
+    "vectorf": [1.5, -2.25, 3.0, 4.5, 0.0],
+    "vectori": [3, -1, 4, 1, -5],
+    "vectorull": [2**64 - 1, 0, 7, 2**40, 1],
+}
+
+
+def elements(vector):
+    return [str(value) for value in vector] if isinstance(vector, Client3.vectorss) else list(vector)
+
+
+def operations(values):
+    """Each step is done on a vector and on a list; both must then hold the same."""
+    a, b = values[0], values[1]
+    return [
+        ("append", lambda s: s.append(a)),
+        ("extend", lambda s: s.extend([b, a])),
+        ("insert front", lambda s: s.insert(0, b)),
+        ("insert negative", lambda s: s.insert(-2, a)),
+        ("insert past end", lambda s: s.insert(100, b)),
+        ("set negative", lambda s: s.__setitem__(-1, a)),
+        ("set slice", lambda s: s.__setitem__(slice(1, 3), [b, b, b])),
+        ("delete index", lambda s: s.__delitem__(-2)),
+        ("delete slice", lambda s: s.__delitem__(slice(0, 2))),
+        ("delete stepped", lambda s: s.__delitem__(slice(None, None, 2))),
+        ("pop last", lambda s: s.pop()),
+        ("pop first", lambda s: s.pop(0)),
+        ("reverse", lambda s: s.reverse()),
+        ("remove", lambda s: s.remove(s[0])),
+    ]
+
+
+@pytest.mark.parametrize("name", sorted(Client3.VECTORS))
+def test_vector_follows_a_list(name):
+    values = SAMPLES.get(name, ["alpha", "beta", "gamma", "delta", "epsilon"])
+    vector, model = Client3.classes[name](values), list(values)
+    assert isinstance(vector, collections.abc.MutableSequence)
+    for step, operation in operations(values):
+        result, expected = operation(vector), operation(model)
+        assert (str(result) if isinstance(result, Client3.SafeString) else result) == expected, step
+        assert elements(vector) == model, step
+        assert len(vector) == len(model), step
+    assert elements(vector[::-1]) == model[::-1]
+    assert elements(reversed(vector)) == model[::-1]
+    assert [v == m for v, m in zip(vector, model)] == [True] * len(model)
+    assert vector[-1] == model[-1] and vector[0] == model[0]
+    assert model[0] in vector and vector == model and vector == Client3.classes[name](model)
+    assert vector != model + model[:1]
+
+
+@pytest.mark.parametrize("name", sorted(Client3.VECTORS))
+def test_vector_errors_are_the_modules(name):
+    vector = Client3.classes[name]()
+    with pytest.raises(IndexError):
+        vector.pop()
+    with pytest.raises(IndexError):
+        vector[0]
+
+
+def test_vector_iteration_uses_the_modules_iterator():
+    iterator = iter(Client3.vectori([1, 2]))
+    assert isinstance(iterator, Client3.SwigPyIterator)
+    assert list(iterator) == [1, 2]
+
+
+@pytest.mark.parametrize("length, text", [
+    (3, "vectori([0, 1, 2])"),
+    (31, "vectori([" + ", ".join(map(str, range(30))) + ", ... (31 elements)])"),
+])
+def test_vector_repr_shows_elements_abbreviated(length, text):
+    assert repr(Client3.vectori(range(length))) == text
+
+
+def test_safe_string_text_and_equality():
+    text = Client3.SafeString("walk")
+    assert str(text) == "walk"
+    assert text == "walk" and text != "run"
+    assert "walk" in Client3.vectorss(["walk"])
+
+
+def test_record_fields_are_properties_that_get_and_set():
+    record = Client3.Output_ReconstructSettings()
+    for field in Client3.TABLE["Output_ReconstructSettings"].fields:
+        value = getattr(record, field)
+        setattr(record, field, value)
+        assert getattr(record, field) == value
+    parameter = Client3.Type_Parameter()
+    parameter.Name = Client3.SafeString("Subject")
+    assert str(parameter.Name) == "Subject"
+    assert repr(parameter) == "Type_Parameter(Name='Subject', Value='')"
+
+
+def test_record_fields_of_every_record_are_read(client):
+    records = [
+        client.GetSceneName(), client.GetSubjectNames(), client.GetMarkerNames("Alice"),
+        client.GetTrajectory("Alice", "LANK"), client.GetTrajectoryAtFrame("Alice", "LANK", 1),
+        client.GetBoneDetails("Alice", "", "Pelvis"), client.GetConstraintDetails("Alice", "", "LANK_LeftFoot"),
+        client.GetSubjectParamDetails("Alice", "", "Mass"), client.GetCommandInfo("Log"),
+    ]
+    for record in records:
+        shown = repr(record)
+        for field in record._fields:
+            assert f"{field}=" in shown
+
+
+def test_a_field_keeps_its_record_alive(client):
+    names = client.GetSubjectNames().Names
+    assert [str(name) for name in names] == ["Alice", "Bob"]
+
+
+def test_results_and_errors(client):
+    good = client.GetMarkerNames("Alice")
+    bad = client.GetMarkerNames("Carol")
+    assert good.ok and good.check() is good
+    assert not bad.ok
+    with pytest.raises(Client3.Error) as caught:
+        bad.check()
+    assert caught.value.code == Client3.ApplicationError
+    assert "Carol" in caught.value.text and "Carol" in str(caught.value)
+
+
+def test_connect_refused_raises_the_result_code():
+    with running_host(log=False) as gone:
+        pass
+    with pytest.raises(Client3.Error) as caught:
+        Client3.connect(gone.address, gone.port)
+    assert caught.value.code == Client3.NotConnected
+
+
+def test_client_disconnects_at_the_end_of_with(host):
+    with Client3.connect(host.address, host.port) as client:
+        assert client.IsConnected()
+    assert not client.IsConnected()
+
+
+def test_trajectory_written_is_read_back(client):
+    frame = client.GetTrajectoryAtFrame("Bob", "C7", 5).check()
+    assert client.SetTrajectoryAtFrame("Bob", "C7", 5, 1.0, 2.0, 3.0, True).ok
+    assert client.GetTrajectoryAtFrame("Bob", "C7", 5).X == 1.0
+    client.SetTrajectoryAtFrame("Bob", "C7", 5, frame.X, frame.Y, frame.Z, frame.E).check()
+
+
+@pytest.mark.parametrize("scene, frames, subjects", [("demo", 50, ["Alice", "Bob"]), ("empty", 20, [])])
+def test_running_host_serves_the_scene_asked_for(scene, frames, subjects):
+    with running_host(scene=scene, frames=frames, log=False) as host:
+        with Client3.connect(host.address, host.port) as client:
+            assert client.GetFrameCount() == frames
+            assert [str(s) for s in client.GetSubjectNames().check().Names] == subjects
+    assert host.process.poll() is not None
+
+
+def test_python_m_host_prints_the_same_first_line_and_stops_on_terminate():
+    process = subprocess.Popen([sys.executable, "-m", "Client3.host", "--port", "0", "--frames", "10"],
+                               stdout=subprocess.PIPE, stderr=subprocess.DEVNULL, text=True)
+    try:
+        first = process.stdout.readline()
+        assert first.startswith("listening on 127.0.0.1:")
+        port = int(first.rsplit(":", 1)[1])
+        with Client3.connect("127.0.0.1", port) as client:
+            assert client.GetFrameCount() == 10
+    finally:
+        process.terminate()
+        assert process.wait(10) == 0
+        process.stdout.close()
+
+
+def test_python_m_host_refuses_what_the_application_refuses():
+    done = subprocess.run([sys.executable, "-m", "Client3.host", "--scene", "nowhere"], capture_output=True, timeout=30)
+    assert done.returncode != 0
+
+
+def test_stubs_agree_with_the_function_table():
+    done = subprocess.run([sys.executable, "-m", "Client3._generate", "--check"], cwd=ROOT, capture_output=True, text=True, timeout=60)
+    assert done.returncode == 0, done.stderr

@@ -1,0 +1,39 @@
+"""The examples run against their own application, and a strict type check passes on them."""
+import glob
+import os
+import subprocess
+import sys
+
+import pytest
+
+ROOT = os.path.dirname(os.path.dirname(os.path.abspath(__file__)))
+EXAMPLES = sorted(glob.glob(os.path.join(ROOT, "examples", "*.py")))
+
+
+def run(*arguments, cwd):
+    return subprocess.run([sys.executable, *arguments], cwd=cwd, capture_output=True, text=True, timeout=120)
+
+
+def test_session_prints_the_account_and_writes_the_plot(tmp_path):
+    done = run(os.path.join(ROOT, "examples", "session.py"), cwd=tmp_path)
+    assert done.returncode == 0, done.stderr
+    lines = done.stdout.splitlines()
+    assert lines[0] == "Pellux Post 1.0.0"
+    assert lines[1] == "scene 'Demo', frames 1 to 1000 at 100 Hz (10 s)"
+    assert "subject Alice:" in lines and "subject Bob:" in lines
+    assert "  RWRA   seen in   920 frames, 1 gap(s)" in lines
+    with open(tmp_path / "session.png", "rb") as plot:
+        assert plot.read(8) == b"\x89PNG\r\n\x1a\n"
+
+
+def test_session_reports_an_unknown_marker(tmp_path):
+    done = run(os.path.join(ROOT, "examples", "session.py"), "--marker", "XYZ", "--plot", "x.png", cwd=tmp_path)
+    assert done.returncode != 0
+    assert "no marker named 'XYZ'" in done.stderr
+    assert not (tmp_path / "x.png").exists()
+
+
+@pytest.mark.parametrize("example", EXAMPLES, ids=os.path.basename)
+def test_examples_pass_a_strict_type_check(example):
+    done = run("-m", "mypy", "--strict", "--no-incremental", example, cwd=ROOT)
+    assert done.returncode == 0, done.stdout
