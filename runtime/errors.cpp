@@ -59,18 +59,17 @@ void AddErrorMsg(const char* message) {
   }
   PyObject *type, *value, *trace;
   PyErr_Fetch(&type, &value, &trace);
-  // An old value without text leaves the message alone; a text that cannot be read as UTF-8 is
-  // named as such.
+  // An old value without text leaves the message alone, and so does one whose text is empty (an
+  // exception class raised with no arguments: older interpreters hand it over as the class alone,
+  // newer ones as an instance); a text that cannot be read as UTF-8 is named as such.
   PyObject* old = value ? PyObject_Str(value) : nullptr;
-  if (old) {
-    const char* oldText = PyUnicode_AsUTF8(old);
-    PyErr_Clear();
+  const char* oldText = old ? PyUnicode_AsUTF8(old) : nullptr;
+  PyErr_Clear();
+  if (old && (!oldText || *oldText))
     PyErr_Format(type, "%s %s", oldText ? oldText : "Invalid error message", message);
-    Py_DECREF(old);
-  } else {
-    PyErr_Clear();
+  else
     PyErr_Format(type, "%s", message);
-  }
+  Py_XDECREF(old);
   Py_XDECREF(type);
   Py_XDECREF(value);
   Py_XDECREF(trace);
