@@ -11,6 +11,7 @@
 #include <unordered_map>
 
 #include "host/text.h"
+#include "platform/net.h"
 
 namespace client3::host {
 
@@ -30,13 +31,7 @@ void LogLine(std::string_view level, std::string_view message) {
     else if (static_cast<unsigned char>(c) < 0x20 || c == 0x7f) line += '?';
     else line += c;
   }
-  auto now = std::chrono::system_clock::to_time_t(std::chrono::system_clock::now());
-  std::tm local{};
-#ifdef _WIN32
-  localtime_s(&local, &now);
-#else
-  localtime_r(&now, &local);
-#endif
+  std::tm local = platform::LocalTime(std::chrono::system_clock::to_time_t(std::chrono::system_clock::now()));
   char stamp[32];
   std::strftime(stamp, sizeof stamp, "%Y-%m-%d %H:%M:%S", &local);
   std::fprintf(stderr, "%s %.*s %s\n", stamp, static_cast<int>(level.size()), level.data(), line.c_str());

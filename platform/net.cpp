@@ -1,4 +1,4 @@
-// Sockets, stop requests and file replacement on POSIX systems and on Windows.
+// Sockets, stop requests, file replacement and local time on POSIX systems and on Windows.
 #include "platform/net.h"
 
 #include <cerrno>
@@ -31,7 +31,28 @@ constexpr int kSendFlags = 0;
 int LastError() { return WSAGetLastError(); }
 bool InProgress(int error) { return error == WSAEWOULDBLOCK || error == WSAEINPROGRESS; }
 bool Interrupted(int) { return false; }
-int PollOnce(pollfd* fd, int ms) { return WSAPoll(fd, 1, ms); }
+// select() rather than WSAPoll: WSAPoll of some Windows versions never reports a connection attempt
+// that failed, where select() names it among the exceptions.
+int PollOnce(pollfd* fd, int ms) {
+  auto s = static_cast<SOCKET>(fd->fd);
+  fd_set readable, writable, failed;
+  FD_ZERO(&readable);
+  FD_ZERO(&writable);
+  FD_ZERO(&failed);
+  if (fd->events & POLLIN) FD_SET(s, &readable);
+  if (fd->events & POLLOUT) {
+    FD_SET(s, &writable);
+    FD_SET(s, &failed);
+  }
+  timeval limit{ms / 1000, (ms % 1000) * 1000};
+  int ready = ::select(0, &readable, &writable, &failed, ms < 0 ? nullptr : &limit);
+  fd->revents = 0;
+  if (ready <= 0) return ready;
+  if (FD_ISSET(s, &readable)) fd->revents |= POLLIN;
+  if (FD_ISSET(s, &writable)) fd->revents |= POLLOUT;
+  if (FD_ISSET(s, &failed)) fd->revents |= POLLERR;
+  return 1;
+}
 void SetBlocking(std::uintptr_t s, bool blocking) {
   u_long nonBlocking = blocking ? 0 : 1;
   ioctlsocket(static_cast<SOCKET>(s), FIONBIO, &nonBlocking);
@@ -156,8 +177,11 @@ Socket Socket::Listen(const std::string& host, int port, std::string& error) {
   for (addrinfo* a = addresses.list; a; a = a->ai_next) {
     Socket s(static_cast<Handle>(::socket(a->ai_family, a->ai_socktype, a->ai_protocol)));
     if (!s.valid()) continue;
-#ifndef _WIN32
     int one = 1;
+#ifdef _WIN32
+    // Windows lets a later socket with SO_REUSEADDR take over a bound port unless this one forbids it.
+    setsockopt(s.handle_, SOL_SOCKET, SO_EXCLUSIVEADDRUSE, reinterpret_cast<const char*>(&one), sizeof one);
+#else
     setsockopt(s.handle_, SOL_SOCKET, SO_REUSEADDR, &one, sizeof one);
 #endif
     if (::bind(s.handle_, a->ai_addr, static_cast<Length>(a->ai_addrlen)) != 0 || ::listen(s.handle_, 64) != 0) {
@@ -252,6 +276,9 @@ void Socket::Shutdown() {
   if (!valid()) return;
 #ifdef _WIN32
   ::shutdown(handle_, SD_BOTH);
+  // On Windows a shutdown alone leaves a thread blocked in recv() waiting; cancelling the socket's
+  // pending operations wakes it.
+  CancelIoEx(reinterpret_cast<HANDLE>(handle_), nullptr);
 #else
   ::shutdown(handle_, SHUT_RDWR);
 #endif
@@ -270,8 +297,11 @@ void Socket::Close() {
 namespace {
 void (*stopHandler)() = nullptr;
 #ifdef _WIN32
-BOOL WINAPI ConsoleEvent(DWORD) {
+BOOL WINAPI ConsoleEvent(DWORD event) {
   if (stopHandler) stopHandler();
+  // Closing the console, logging off and shutting down end the process as soon as this returns:
+  // waiting here gives the process time to stop by itself (it ends this thread when it exits).
+  if (event == CTRL_CLOSE_EVENT || event == CTRL_LOGOFF_EVENT || event == CTRL_SHUTDOWN_EVENT) Sleep(4000);
   return TRUE;
 }
 #else
@@ -294,12 +324,36 @@ void OnStopRequest(void (*stop)()) {
 #endif
 }
 
+#ifdef _WIN32
+namespace {
+// A UTF-8 path as Windows' own UTF-16; empty when it is not valid UTF-8.
+std::wstring Widen(const std::string& text) {
+  int size = MultiByteToWideChar(CP_UTF8, MB_ERR_INVALID_CHARS, text.data(), static_cast<int>(text.size()), nullptr, 0);
+  std::wstring wide(static_cast<std::size_t>(size > 0 ? size : 0), L'\0');
+  if (size > 0) MultiByteToWideChar(CP_UTF8, MB_ERR_INVALID_CHARS, text.data(), static_cast<int>(text.size()), wide.data(), size);
+  return wide;
+}
+}  // namespace
+#endif
+
 bool ReplaceFile(const std::string& temporary, const std::string& path) {
 #ifdef _WIN32
-  return MoveFileExA(temporary.c_str(), path.c_str(), MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH) != 0;
+  std::wstring from = Widen(temporary), to = Widen(path);
+  if (from.empty() || to.empty()) return false;
+  return MoveFileExW(from.c_str(), to.c_str(), MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH) != 0;
 #else
   return std::rename(temporary.c_str(), path.c_str()) == 0;
 #endif
+}
+
+std::tm LocalTime(std::time_t time) {
+  std::tm local{};
+#ifdef _WIN32
+  localtime_s(&local, &time);
+#else
+  localtime_r(&time, &local);
+#endif
+  return local;
 }
 
 }  // namespace client3::platform

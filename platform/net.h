@@ -1,11 +1,13 @@
 // The small platform layer under the library and the host: TCP sockets with time limits, the stop
-// signals of a console process, and replacing a file in one step. Everything system-specific of the
-// library and the host lives behind these few functions.
+// signals of a console process, replacing a file in one step, and the local time. Everything
+// system-specific of the library and the host lives behind these few functions; threads are the
+// standard library's.
 #pragma once
 
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <ctime>
 #include <string>
 
 namespace client3::platform {
@@ -71,7 +73,11 @@ private:
 // events). `stop` must only do what is safe in a signal handler: set an atomic flag.
 void OnStopRequest(void (*stop)());
 
-// Replaces `path` with `temporary` in one step: a reader sees the old file or the new one.
+// Replaces `path` with `temporary` in one step: a reader sees the old file or the new one. Paths
+// are UTF-8.
 bool ReplaceFile(const std::string& temporary, const std::string& path);
+
+// The calendar time `time` in the local time zone.
+std::tm LocalTime(std::time_t time);
 
 }  // namespace client3::platform
