@@ -105,11 +105,13 @@ def parameters(client, vector):
 
 
 def wait_until(condition, seconds=3.0):
-    """Polls `condition` every 20 ms for at most `seconds`; returns its last answer."""
+    """Asks `condition` every 20 ms until it holds, for at most `seconds`; whether it came to hold."""
     deadline = time.monotonic() + seconds
-    while not condition() and time.monotonic() < deadline:
+    while not condition():
+        if time.monotonic() > deadline:
+            return False
         time.sleep(0.02)
-    return condition()
+    return True
 
 
 @pytest.fixture
@@ -200,6 +202,7 @@ def test_second_connect_replaces_the_first(start_host, clients):
     client = clients(only_one)
     refused = clients()
     assert result(connect(refused, only_one)) == (m.ApplicationError, "the application serves at most 1 clients at once")
+    assert call(refused, "IsConnected") is False
 
     ok(connect(client, empty))
     assert read(ok(call(client, "GetSceneName")), "Name") == "Untitled"
@@ -285,7 +288,11 @@ QUERIES = [
 ]
 
 
-@pytest.mark.parametrize("operation, args, expected", QUERIES, ids=lambda v: v if isinstance(v, str) else "")
+def _ids(table):
+    return ["-".join(map(str, (row[0], *row[1]))) for row in table]
+
+
+@pytest.mark.parametrize("operation, args, expected", QUERIES, ids=_ids(QUERIES))
 def test_query_of_the_demo_scene(client, operation, args, expected):
     record = call(client, operation, *args)
     assert result(record) == (m.Success, "OK")
@@ -330,7 +337,7 @@ REFUSALS = [
 ]
 
 
-@pytest.mark.parametrize("operation, args, code, message", REFUSALS, ids=lambda v: v if isinstance(v, str) else "")
+@pytest.mark.parametrize("operation, args, code, message", REFUSALS, ids=_ids(REFUSALS))
 def test_refusal_carries_the_application_message(client, operation, args, code, message):
     assert result(call(client, operation, *args)) == (code, message)
     # The connection is still good for the next request.
@@ -582,13 +589,13 @@ def test_timed_out_request_and_its_late_reply(start_host, clients):
     client = clients(host, "timeout=300")
     started = time.monotonic()
     assert result(call(client, "GetSceneName")) == (m.RequestTimedOut, TIMED_OUT)
-    assert 0.25 < time.monotonic() - started < 0.9
+    assert time.monotonic() - started > 0.25
     assert call(client, "IsConnected") is True
     # Once the late reply has come, the next request must get its own reply and never that one.
-    time.sleep(1.0)
+    time.sleep(1.2)
     assert read(ok(call(client, "GetSubjectNames")), "Models") == ["Walker", "Walker"]
     assert call(client, "GetFrameCount") == 0
-    time.sleep(1.0)
+    time.sleep(1.2)
     assert read(ok(call(client, "GetMarkerNames", "Alice")), "Names") == MARKERS
 
 
@@ -668,33 +675,37 @@ def shake_hands(sock, count):
     assert read_frame(sock) == b"H" + struct.pack("<HH", 1, count)
 
 
-@pytest.mark.parametrize("case", ["http before hello", "frame that is no hello", "hello of another version",
-                                  "oversized before hello", "oversized after hello", "empty after hello",
-                                  "no request after hello"])
-def test_misbehaving_peer_is_refused_and_closed(start_host, clients, commands, case):
-    count = len(commands)
-    sent, refused = {
-        "http before hello": (b"GET / HTTP/1.1\r\nHost: localhost\r\n\r\n", None),
-        "frame that is no hello": (frame(b"garbage!"), "this is not a client of the application"),
-        "hello of another version": (hello(count, version=2),
-                                     f"this application speaks version 1 of the protocol with {count} commands"),
-        "oversized before hello": (struct.pack("<I", MAX_FRAME + 1), None),
-        "oversized after hello": (struct.pack("<I", MAX_FRAME + 1), f"a frame may hold at most {MAX_FRAME} bytes"),
-        "empty after hello": (struct.pack("<I", 0), f"a frame may hold at most {MAX_FRAME} bytes"),
-        "no request after hello": (frame(b"\x00" + bytes(range(200))), "a frame that is not a request"),
-    }[case]
+PEERS = [
+    # what the peer sends, given the number of commands; whether it shook hands first; the refusal it
+    # gets before the application closes the connection (None: closed without a word)
+    ("http before hello", lambda n: b"GET / HTTP/1.1\r\nHost: localhost\r\n\r\n", False, None),
+    ("frame that is no hello", lambda n: frame(b"garbage!"), False, "this is not a client of the application"),
+    ("hello of another version", lambda n: hello(n, version=2), False,
+     "this application speaks version 1 of the protocol with {n} commands"),
+    ("hello with other commands", lambda n: hello(n - 1), False,
+     "this application speaks version 1 of the protocol with {n} commands"),
+    ("oversized before hello", lambda n: struct.pack("<I", MAX_FRAME + 1), False, None),
+    ("oversized after hello", lambda n: struct.pack("<I", MAX_FRAME + 1), True, f"a frame may hold at most {MAX_FRAME} bytes"),
+    ("empty after hello", lambda n: struct.pack("<I", 0), True, f"a frame may hold at most {MAX_FRAME} bytes"),
+    ("no request after hello", lambda n: frame(b"\x00" + bytes(range(200))), True, "a frame that is not a request"),
+]
+
+
+@pytest.mark.parametrize("sent, after_hello, refused", [p[1:] for p in PEERS], ids=[p[0] for p in PEERS])
+def test_misbehaving_peer_is_refused_and_closed(start_host, clients, commands, sent, after_hello, refused):
     host = start_host()
     with raw_connection(host) as sock:
-        if case.endswith("after hello"):
-            shake_hands(sock, count)
-        sock.sendall(sent)
+        if after_hello:
+            shake_hands(sock, len(commands))
+        sock.sendall(sent(len(commands)))
         if refused:
-            assert refusal(read_frame(sock)) == refused
+            assert refusal(read_frame(sock)) == refused.format(n=len(commands))
         assert read_frame(sock) is None
     assert_serves(host, clients)
 
 
-@pytest.mark.parametrize("request_frame, code, message", [
+MALFORMED = [
+    # the request, given the list of commands; the code and message of its reply (None: no such command)
     (lambda c: request(7, len(c)), m.ApplicationError, None),
     (lambda c: request(7, c.index("GetMarkerNames"), b"\x02" + struct.pack("<i", 5)), m.ApplicationError,
      "the request for 'GetMarkerNames' does not match the command: a value has the wrong type"),
@@ -703,7 +714,11 @@ def test_misbehaving_peer_is_refused_and_closed(start_host, clients, commands, c
     (lambda c: request(7, c.index("GetFrameCount"), text_value("extra")), m.ApplicationError,
      "the request for 'GetFrameCount' does not match the command: the frame has more values than the command takes"),
     (lambda c: request(7, c.index("GetRootBone"), text_value("Bob"), text_value("Walker")), m.Success, ""),
-])
+]
+
+
+@pytest.mark.parametrize("request_frame, code, message", MALFORMED,
+                         ids=["unknown command", "wrong type", "too short", "too long", "well formed"])
 def test_malformed_request_is_refused_and_the_connection_stays(host, commands, request_frame, code, message):
     with raw_connection(host) as sock:
         shake_hands(sock, len(commands))
