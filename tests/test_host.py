@@ -178,6 +178,14 @@ def test_connection_life(host, clients):
     assert read(ok(call(client, "GetSceneName")), "Name") == "Demo"
 
 
+@pytest.mark.parametrize("address", ["", "127.0.0.1?timeout=0", "localhost?connect=2000&timeout=5000"])
+def test_connect_address_forms(start_host, clients, address):
+    host = start_host("--fault", "delay=200@GetSubjectNames")  # a reply that keeps the client waiting
+    client = clients()
+    assert result(call(client, "Connect", address, host.port)) == (m.Success, "OK")
+    assert read(ok(call(client, "GetSubjectNames")), "Names") == ["Alice", "Bob"]
+
+
 def _port_where_nothing_listens():
     # A bound socket that does not listen refuses every connection to its port.
     closed = socket.socket()
@@ -734,20 +742,20 @@ def test_random_frames_are_answered_or_refused(start_host, clients, commands):
     host = start_host()
     rng = random.Random(20261123)
     deadline = time.monotonic() + 20
-    for round in range(60):
+    for turn in range(60):
         assert time.monotonic() < deadline
         body = bytes(rng.randrange(256) for _ in range(rng.randrange(1, 48)))
         with raw_connection(host) as sock:
             shake_hands(sock, len(commands))
-            if round % 2:
+            if turn % 2:
                 sock.sendall(frame(bytes([rng.choice(b"HRE\x00\xff")]) + body))
                 assert refusal(read_frame(sock)) == "a frame that is not a request"
                 assert read_frame(sock) is None
             else:
-                sock.sendall(request(round + 1, rng.randrange(len(commands) + 10), body))
-                assert reply(read_frame(sock))[:2] == (round + 1, m.ApplicationError)
-                sock.sendall(request(round + 2, commands.index("GetFrameCount")))
-                assert reply(read_frame(sock))[:2] == (round + 2, m.Success)
+                sock.sendall(request(turn + 1, rng.randrange(len(commands) + 10), body))
+                assert reply(read_frame(sock))[:2] == (turn + 1, m.ApplicationError)
+                sock.sendall(request(turn + 2, commands.index("GetFrameCount")))
+                assert reply(read_frame(sock))[:2] == (turn + 2, m.Success)
     assert_serves(host, clients)
 
 
