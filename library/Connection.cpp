@@ -98,7 +98,7 @@ ResultCode::Enum ClientConnection::Receive(Clock::time_point deadline) {
   char header[kHeaderSize];
   Io io = socket_.ReceiveAll(header, sizeof header, deadline);
   if (io == Io::TimedOut) return ResultCode::RequestTimedOut;
-  if (io == Io::Closed) return Lost();
+  if (io != Io::Done) return HalfFrame(io);
   std::uint32_t size;
   std::memcpy(&size, header, sizeof size);
   if (size == 0 || size > kMaxFrame) {
@@ -108,16 +108,24 @@ ResultCode::Enum ClientConnection::Receive(Clock::time_point deadline) {
   }
   reply_.resize(size);
   io = socket_.ReceiveAll(reply_.data(), size, deadline);
-  if (io == Io::Done) return ResultCode::Success;
-  // Half a frame: the rest can no longer be told apart from the next reply.
+  return io == Io::Done ? ResultCode::Success : HalfFrame(io);
+}
+
+// Part of a frame: the rest could no longer be told apart from the next reply.
+ResultCode::Enum ClientConnection::HalfFrame(Io io) {
   socket_.Close();
-  return io == Io::TimedOut ? ResultCode::RequestTimedOut : ResultCode::NotConnected;
+  return io == Io::Closed ? ResultCode::NotConnected : ResultCode::RequestTimedOut;
 }
 
 ResultCode::Enum ClientConnection::Call::Exchange(std::string& message) {
   ClientConnection& c = connection_;
   if (!c.socket_.valid()) return ResultCode::NotConnected;
   std::string_view frame = c.request_.Finish();
+  if (frame.size() - kHeaderSize > kMaxFrame) {
+    message = "the request takes " + std::to_string(frame.size() - kHeaderSize) + " bytes, more than the application accepts (" +
+              std::to_string(kMaxFrame) + ")";
+    return ResultCode::ApplicationError;
+  }
   if (!c.socket_.SendAll(frame.data(), frame.size())) return c.Lost();
   Clock::time_point deadline =
       c.replyTimeout_.count() ? Clock::now() + c.replyTimeout_ : Clock::time_point::max();

@@ -53,6 +53,7 @@ public:
 private:
   ResultCode::Enum Receive(client3::platform::Clock::time_point deadline);
   ResultCode::Enum Lost();
+  ResultCode::Enum HalfFrame(client3::platform::Io io);
 
   mutable std::mutex mutex_;
   client3::platform::Socket socket_;

@@ -243,8 +243,9 @@ bool Socket::SendAll(const char* data, std::size_t size) {
 }
 
 Io Socket::ReceiveAll(char* data, std::size_t size, Clock::time_point deadline) {
+  const char* start = data;
   while (size > 0) {
-    if (deadline != Clock::time_point::max() && !Wait(false, deadline)) return Io::TimedOut;
+    if (deadline != Clock::time_point::max() && !Wait(false, deadline)) return data == start ? Io::TimedOut : Io::Stalled;
     int chunk = size > (1u << 30) ? (1 << 30) : static_cast<int>(size);
     auto got = ::recv(handle_, data, chunk, 0);
     if (got <= 0) {

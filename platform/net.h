@@ -14,7 +14,8 @@ namespace client3::platform {
 
 using Clock = std::chrono::steady_clock;
 
-enum class Io { Done, TimedOut, Closed };
+// TimedOut: nothing arrived in time; Stalled: part of the bytes arrived, the rest did not.
+enum class Io { Done, TimedOut, Stalled, Closed };
 
 class Socket {
 public:

@@ -341,7 +341,7 @@ REFUSALS = [
      "parameter 'Frame' of 'GetTrajectoryAtFrame' is not a int: 'ten'"),
     ("PSL", ("GetTrajectoryAtFrame Subject=Alice Marker=LANK Frame=1001",), m.InvalidFrameNumber,
      "frame 1001 is outside the take (1 to 1000)"),
-    ("PSL", ("TimelineGetFrames",), m.ApplicationError, "'TimelineGetFrames' is not available in this version of the application"),
+    ("PSL", ("ObjectGetType Object=99999999",), m.ApplicationError, "no object with id 99999999"),
 ]
 
 
@@ -409,6 +409,17 @@ def test_set_trajectory_of_the_wrong_length_is_refused(writable, clients, length
     given = ", ".join(map(str, lengths))
     assert result(record) == (m.ApplicationError, f"a trajectory needs 1000 frames in X, Y, Z and E (given {given})")
     assert trajectory(client, "Alice", "LANK") == before
+
+
+def test_request_larger_than_a_frame_is_refused_before_it_is_sent(client):
+    frames = 3_000_000  # 25 bytes a frame: more than the 64 MiB a frame may hold
+    x = [1.0] * frames
+    record = call(client, "SetTrajectory", "Alice", "LANK", x, x, x, [True] * frames)
+    code, text = result(record)
+    assert code == m.ApplicationError
+    assert text.startswith("the request takes 75000") and text.endswith(f"more than the application accepts ({MAX_FRAME})")
+    assert m.ZarvoPelluxPostClient_IsConnected(client)
+    assert len(trajectory(client, "Alice", "LANK")["X"]) == FRAMES
 
 
 def test_set_trajectory_at_frame_changes_that_frame_alone(writable, clients):
@@ -525,7 +536,7 @@ def test_process_request_refused_leaves_the_vector_alone(client, command, messag
     ("GetMarkerNames", [("Subject", "")], "no subject named ''"),
     ("GetTrajectoryAtFrame", [("Subject", ""), ("Marker", ""), ("Frame", "0")], "no subject named ''"),
     ("SetSceneName", [("Name", "")], "a scene name cannot be empty"),
-    ("TimelineSetFrames", [("Frame", "0")], "'TimelineSetFrames' is not available in this version of the application"),
+    ("ObjectGetPath", [("Object", "0")], "no object with id 0"),
 ])
 def test_process_request_with_the_described_defaults(client, command, defaults, message):
     info = ok(call(client, "GetCommandInfo", command))
