@@ -1,5 +1,5 @@
-// The handlers of the application's commands. A handler is a specialisation of Handle<Id>; commands
-// without one are answered by the primary template, which refuses them as not available.
+// The handlers of the connection, command-protocol and subject commands, and the dispatch of every
+// command to its group's handler.
 #include "host/commands.h"
 
 #include <algorithm>
@@ -10,6 +10,7 @@
 #include <optional>
 #include <unordered_map>
 
+#include "host/handlers.h"
 #include "host/text.h"
 #include "platform/net.h"
 
@@ -42,37 +43,43 @@ namespace {
 
 // ---- Lookups that refuse with a message naming what is missing ---------------------------------
 
-Subject& SubjectOf(Scene& scene, std::string_view name) {
-  if (Subject* s = scene.FindSubject(name)) return *s;
+Object& SubjectOf(Scene& scene, std::string_view name) {
+  if (Object* s = scene.FindSubject(name)) return *s;
   Refuse("no subject named '" + std::string(name) + "'");
 }
 
 // A subject's skeleton: named after its model; an empty name means the subject's own.
-Subject& SkeletonOf(Scene& scene, std::string_view subject, std::string_view skeleton) {
-  Subject& s = SubjectOf(scene, subject);
-  if (!skeleton.empty() && skeleton != s.model)
+Object& SkeletonOf(Scene& scene, std::string_view subject, std::string_view skeleton) {
+  Object& s = SubjectOf(scene, subject);
+  if (!skeleton.empty() && skeleton != s.Text("Model"))
     Refuse("subject '" + s.name + "' has no skeleton named '" + std::string(skeleton) + "'");
   return s;
 }
 
-template <class T>
-T& Named(std::vector<T>& list, std::string_view name, std::string_view what, const Subject& owner) {
-  if (T* item = FindNamed(list, name)) return *item;
+Object& Named(const std::vector<Object*>& list, std::string_view name, std::string_view what, const Object& owner) {
+  for (Object* item : list)
+    if (item->name == name) return *item;
   Refuse("subject '" + owner.name + "' has no " + std::string(what) + " named '" + std::string(name) + "'");
 }
 
 template <class T>
 std::vector<std::string> NamesOf(const std::vector<T>& list) {
   std::vector<std::string> names;
-  for (const T& item : list) names.push_back(item.name);
+  for (const T& item : list) {
+    if constexpr (std::is_pointer_v<T>)
+      names.push_back(item->name);
+    else
+      names.push_back(item.name);
+  }
   return names;
 }
 
-// A frame number as an index into the take's arrays.
-std::size_t FrameIndex(const Scene& scene, int frame) {
-  if (frame < 1 || frame > scene.frames)
-    throw Failure{BadFrame, "frame " + std::to_string(frame) + " is outside the take (1 to " + std::to_string(scene.frames) + ")"};
-  return static_cast<std::size_t>(frame - 1);
+// The subject parameters: the subject's parameters of kind Number.
+std::vector<Parameter*> SubjectParameters(Object& subject) {
+  std::vector<Parameter*> out;
+  for (Parameter& p : subject.parameters)
+    if (p.kind == ParameterKind::Number) out.push_back(&p);
+  return out;
 }
 
 std::optional<Id> CommandNamed(std::string_view name) {
@@ -145,9 +152,7 @@ std::vector<std::string> Words(std::string_view line) {
 // ---- The handlers -------------------------------------------------------------------------------
 
 template <Id C>
-void Handle(Context&, Reader&, Writer&) {
-  Refuse("'" + std::string(CommandOf(C).name) + "' is not available in this version of the application");
-}
+void Handle(Context&, Reader&, Writer&);
 
 template <>
 void Handle<Id::GetServerInfo>(Context&, Reader&, Writer& out) {
@@ -226,7 +231,7 @@ void Handle<Id::Log>(Context&, Reader& in, Writer&) {
 
 template <>
 void Handle<Id::GetSceneName>(Context& context, Reader&, Writer& out) {
-  out.Put(context.scene.name);
+  out.Put(context.scene.Name());
   out.Put(context.scene.path);
 }
 
@@ -234,96 +239,128 @@ template <>
 void Handle<Id::SetSceneName>(Context& context, Reader& in, Writer&) {
   std::string_view name = in.Text();
   if (name.empty()) Refuse("a scene name cannot be empty");
-  context.scene.name = name;
+  context.scene.Root().name = name;
 }
 
 template <>
 void Handle<Id::GetSubjectNames>(Context& context, Reader&, Writer& out) {
-  auto& subjects = context.scene.subjects;
+  std::vector<Object*> subjects = context.scene.OfType(context.scene.Root(), "Subject");
   out.Put(NamesOf(subjects));
-  out.PutTexts(subjects, [](const Subject& s) -> std::string_view { return s.model; });
+  out.PutTexts(subjects, [](const Object* s) -> std::string_view { return s->Text("Model"); });
   std::vector<bool> active;
-  for (const Subject& s : subjects) active.push_back(s.active);
+  for (const Object* s : subjects) active.push_back(s->Text("Active") == "true");
   out.Put(active);
 }
 
 template <>
 void Handle<Id::GetMarkerNames>(Context& context, Reader& in, Writer& out) {
-  out.Put(NamesOf(SubjectOf(context.scene, in.Text()).markers));
+  Scene& scene = context.scene;
+  out.Put(NamesOf(scene.OfType(SubjectOf(scene, in.Text()), "Marker")));
 }
 
 template <>
 void Handle<Id::GetBoneNames>(Context& context, Reader& in, Writer& out) {
   std::string_view subject = in.Text();
-  out.Put(NamesOf(SkeletonOf(context.scene, subject, in.Text()).bones));
+  out.Put(NamesOf(context.scene.Bones(SkeletonOf(context.scene, subject, in.Text()))));
 }
 
 template <>
 void Handle<Id::GetRootBone>(Context& context, Reader& in, Writer& out) {
   std::string_view subject = in.Text();
-  Subject& s = SkeletonOf(context.scene, subject, in.Text());
-  auto root = std::find_if(s.bones.begin(), s.bones.end(), [](const Bone& b) { return b.parent.empty(); });
-  out.Put(root == s.bones.end() ? std::string() : root->name);
+  std::vector<Object*> roots = context.scene.OfType(SkeletonOf(context.scene, subject, in.Text()), "Bone");
+  out.Put(roots.empty() ? std::string() : roots.front()->name);
 }
 
 template <>
 void Handle<Id::GetBoneDetails>(Context& context, Reader& in, Writer& out) {
+  Scene& scene = context.scene;
   std::string_view subject = in.Text(), skeleton = in.Text();
-  Subject& s = SkeletonOf(context.scene, subject, skeleton);
-  Bone& bone = Named(s.bones, in.Text(), "bone", s);
-  out.Put(bone.parent);
-  out.Put(bone.children);
+  Object& s = SkeletonOf(scene, subject, skeleton);
+  Object& bone = Named(scene.Bones(s), in.Text(), "bone", s);
+  Object& parent = scene.objects.at(bone.parent);
+  out.Put(parent.type == "Bone" ? parent.name : std::string());
+  out.Put(NamesOf(scene.OfType(bone, "Bone")));
 }
 
 template <>
 void Handle<Id::GetConstraintNames>(Context& context, Reader& in, Writer& out) {
   std::string_view subject = in.Text();
-  out.Put(NamesOf(SkeletonOf(context.scene, subject, in.Text()).constraints));
+  out.Put(NamesOf(context.scene.OfType(SkeletonOf(context.scene, subject, in.Text()), "Constraint")));
 }
 
 template <>
 void Handle<Id::GetConstraintDetails>(Context& context, Reader& in, Writer& out) {
   std::string_view subject = in.Text(), skeleton = in.Text();
-  Subject& s = SkeletonOf(context.scene, subject, skeleton);
-  Constraint& c = Named(s.constraints, in.Text(), "constraint", s);
-  out.Put(c.active);
-  out.Put(c.source);
-  out.Put(c.target);
-  out.Put(c.offset);
-  out.Put(c.type);
+  Object& s = SkeletonOf(context.scene, subject, skeleton);
+  Object& c = Named(context.scene.OfType(s, "Constraint"), in.Text(), "constraint", s);
+  out.Put(c.Text("Active") == "true");
+  out.Put(c.Text("Source"));
+  out.Put(c.Text("Target"));
+  std::vector<float> offset;
+  std::string_view text = c.Text("Offset");
+  for (std::size_t from = 0; from <= text.size();) {
+    std::size_t comma = std::min(text.find(',', from), text.size());
+    offset.push_back(static_cast<float>(ParseDouble(text.substr(from, comma - from)).value_or(0)));
+    from = comma + 1;
+  }
+  out.Put(offset);
+  out.Put(c.Text("ConstraintType"));
 }
 
 template <>
 void Handle<Id::GetSubjectParamNames>(Context& context, Reader& in, Writer& out) {
   std::string_view subject = in.Text();
-  out.Put(NamesOf(SkeletonOf(context.scene, subject, in.Text()).parameters));
+  out.Put(NamesOf(SubjectParameters(SkeletonOf(context.scene, subject, in.Text()))));
 }
 
 template <>
 void Handle<Id::GetSubjectParamDetails>(Context& context, Reader& in, Writer& out) {
-  std::string_view subject = in.Text(), skeleton = in.Text();
-  Subject& s = SkeletonOf(context.scene, subject, skeleton);
-  SubjectParameter& p = Named(s.parameters, in.Text(), "parameter", s);
-  out.Put(p.value);
-  out.Put(p.fallback);
-  out.Put(p.unit);
-  out.Put(p.required);
+  std::string_view subject = in.Text(), skeleton = in.Text(), name = in.Text();
+  Object& s = SkeletonOf(context.scene, subject, skeleton);
+  Parameter* p = s.FindParameter(name);
+  if (!p || p->kind != ParameterKind::Number)
+    Refuse("subject '" + s.name + "' has no parameter named '" + std::string(name) + "'");
+  out.Put(static_cast<float>(ParseDouble(p->value).value_or(0)));
+  out.Put(static_cast<float>(ParseDouble(p->fallback).value_or(0)));
+  out.Put(p->unit);
+  out.Put(p->required);
 }
 
-Marker& MarkerOf(Scene& scene, Reader& in) {
-  Subject& s = SubjectOf(scene, in.Text());
-  return Named(s.markers, in.Text(), "marker", s);
+// A marker's trajectory: its channels X, Y and Z.
+struct Trajectory {
+  Channel &x, &y, &z;
+  bool Seen(std::size_t f) const { return x.keys[f] && y.keys[f] && z.keys[f]; }
+  double At(const Channel& c, std::size_t f) const { return c.values[f]; }
+};
+
+Trajectory TrajectoryOf(Scene& scene, Reader& in) {
+  Object& s = SubjectOf(scene, in.Text());
+  Object& m = Named(scene.OfType(s, "Marker"), in.Text(), "marker", s);
+  return {*m.FindChannel("X"), *m.FindChannel("Y"), *m.FindChannel("Z")};
 }
 
 template <>
 void Handle<Id::GetTrajectory>(Context& context, Reader& in, Writer& out) {
-  Marker& m = MarkerOf(context.scene, in);
-  out.Put(m.x), out.Put(m.y), out.Put(m.z), out.Put(m.e);
+  Trajectory t = TrajectoryOf(context.scene, in);
+  auto frames = static_cast<std::size_t>(context.scene.frames);
+  std::vector<double> x(frames), y(frames), z(frames);
+  std::vector<bool> e(frames);
+  for (std::size_t f = 0; f < frames; ++f) x[f] = t.At(t.x, f), y[f] = t.At(t.y, f), z[f] = t.At(t.z, f), e[f] = t.Seen(f);
+  out.Put(x), out.Put(y), out.Put(z), out.Put(e);
+}
+
+void SetFrame(Trajectory& t, std::size_t f, double x, double y, double z, bool seen) {
+  if (seen) {
+    t.x.SetKey(f, x), t.y.SetKey(f, y), t.z.SetKey(f, z);
+  } else {
+    t.x.DeleteKey(f), t.y.DeleteKey(f), t.z.DeleteKey(f);
+    t.x.values[f] = x, t.y.values[f] = y, t.z.values[f] = z;
+  }
 }
 
 template <>
 void Handle<Id::SetTrajectory>(Context& context, Reader& in, Writer&) {
-  Marker& m = MarkerOf(context.scene, in);
+  Trajectory t = TrajectoryOf(context.scene, in);
   std::vector<double> x, y, z;
   std::vector<bool> e;
   in.Get(x), in.Get(y), in.Get(z), in.Get(e);
@@ -331,36 +368,92 @@ void Handle<Id::SetTrajectory>(Context& context, Reader& in, Writer&) {
   if (x.size() != frames || y.size() != frames || z.size() != frames || e.size() != frames)
     Refuse("a trajectory needs " + std::to_string(frames) + " frames in X, Y, Z and E (given " + std::to_string(x.size()) + ", " +
            std::to_string(y.size()) + ", " + std::to_string(z.size()) + ", " + std::to_string(e.size()) + ")");
-  m.x = std::move(x), m.y = std::move(y), m.z = std::move(z), m.e = std::move(e);
+  for (std::size_t f = 0; f < frames; ++f) SetFrame(t, f, x[f], y[f], z[f], e[f]);
 }
 
 template <>
 void Handle<Id::GetTrajectoryAtFrame>(Context& context, Reader& in, Writer& out) {
-  Marker& m = MarkerOf(context.scene, in);
+  Trajectory t = TrajectoryOf(context.scene, in);
   std::size_t f = FrameIndex(context.scene, in.Get<std::int32_t>());
   auto n = static_cast<std::size_t>(context.faults.framesPerFrame);
-  out.Put(std::vector<double>(n, m.x[f])), out.Put(std::vector<double>(n, m.y[f])), out.Put(std::vector<double>(n, m.z[f]));
-  out.Put(std::vector<bool>(n, m.e[f]));
+  out.Put(std::vector<double>(n, t.At(t.x, f))), out.Put(std::vector<double>(n, t.At(t.y, f)));
+  out.Put(std::vector<double>(n, t.At(t.z, f)));
+  out.Put(std::vector<bool>(n, t.Seen(f)));
 }
 
 template <>
 void Handle<Id::SetTrajectoryAtFrame>(Context& context, Reader& in, Writer&) {
-  Marker& m = MarkerOf(context.scene, in);
+  Trajectory t = TrajectoryOf(context.scene, in);
   std::size_t f = FrameIndex(context.scene, in.Get<std::int32_t>());
   double x = in.Get<double>(), y = in.Get<double>(), z = in.Get<double>();
-  m.e[f] = in.Get<bool>();
-  m.x[f] = x, m.y[f] = y, m.z[f] = z;
+  SetFrame(t, f, x, y, z, in.Get<bool>());
 }
 
-using Handler = void (*)(Context&, Reader&, Writer&);
-constexpr Handler kHandlers[] = {
-#define CLIENT3_HANDLER(name, description, in, out) &Handle<Id::name>,
-    CLIENT3_COMMANDS(CLIENT3_HANDLER)
-#undef CLIENT3_HANDLER
+#define CLIENT3_ENTRY(name) {Id::name, &Handle<Id::name>}
+constexpr HandlerEntry kSceneHandlers[] = {
+    CLIENT3_ENTRY(GetServerInfo),       CLIENT3_ENTRY(GetCommandList),       CLIENT3_ENTRY(GetCommandInfo),
+    CLIENT3_ENTRY(ProcessRequest),      CLIENT3_ENTRY(GetFrameCount),        CLIENT3_ENTRY(SetLanguage),
+    CLIENT3_ENTRY(PSL),                 CLIENT3_ENTRY(Log),                  CLIENT3_ENTRY(GetSceneName),
+    CLIENT3_ENTRY(SetSceneName),        CLIENT3_ENTRY(GetSubjectNames),      CLIENT3_ENTRY(GetMarkerNames),
+    CLIENT3_ENTRY(GetBoneNames),        CLIENT3_ENTRY(GetRootBone),          CLIENT3_ENTRY(GetBoneDetails),
+    CLIENT3_ENTRY(GetConstraintNames),  CLIENT3_ENTRY(GetConstraintDetails), CLIENT3_ENTRY(GetSubjectParamNames),
+    CLIENT3_ENTRY(GetSubjectParamDetails), CLIENT3_ENTRY(GetTrajectory),     CLIENT3_ENTRY(SetTrajectory),
+    CLIENT3_ENTRY(GetTrajectoryAtFrame), CLIENT3_ENTRY(SetTrajectoryAtFrame),
+};
+#undef CLIENT3_ENTRY
+
+// One handler per command number, from every group's table.
+struct Dispatch {
+  Handler handlers[protocol::kCommandCount] = {};
+  Dispatch() {
+    for (auto group : {SceneHandlers(), ObjectHandlers(), FileHandlers(), TimelineHandlers()})
+      for (const HandlerEntry& entry : group) {
+        Handler& slot = handlers[static_cast<std::size_t>(entry.id)];
+        if (slot) {
+          LogLine("error", "'" + std::string(CommandOf(entry.id).name) + "' has two handlers");
+          std::abort();
+        }
+        slot = entry.handler;
+      }
+  }
 };
 
 }  // namespace
 
-void Run(Id id, Context& context, Reader& in, Writer& out) { kHandlers[static_cast<std::size_t>(id)](context, in, out); }
+std::span<const HandlerEntry> SceneHandlers() { return kSceneHandlers; }
+
+Object& ObjectOf(Scene& scene, ObjectId id) {
+  if (Object* o = scene.Find(id)) return *o;
+  Refuse("no object with id " + std::to_string(id));
+}
+
+std::size_t FrameIndex(const Scene& scene, int frame) {
+  if (frame < 1 || frame > scene.frames)
+    throw Failure{BadFrame, "frame " + std::to_string(frame) + " is outside the take (1 to " + std::to_string(scene.frames) + ")"};
+  return static_cast<std::size_t>(frame - 1);
+}
+
+SelectMode ModeOf(int mode) {
+  if (mode < 0 || mode > 3) Refuse("selection mode " + std::to_string(mode) + " is not one of 0 replace, 1 add, 2 remove, 3 toggle");
+  return static_cast<SelectMode>(mode);
+}
+
+void ApplyMode(std::vector<bool>& selected, const std::vector<bool>& chosen, SelectMode mode) {
+  for (std::size_t i = 0; i < selected.size(); ++i) {
+    switch (mode) {
+      case SelectMode::Replace: selected[i] = chosen[i]; break;
+      case SelectMode::Add: selected[i] = selected[i] || chosen[i]; break;
+      case SelectMode::Remove: selected[i] = selected[i] && !chosen[i]; break;
+      case SelectMode::Toggle: selected[i] = selected[i] != chosen[i]; break;
+    }
+  }
+}
+
+void Run(Id id, Context& context, Reader& in, Writer& out) {
+  static const Dispatch dispatch;
+  Handler handler = dispatch.handlers[static_cast<std::size_t>(id)];
+  if (!handler) Refuse("'" + std::string(CommandOf(id).name) + "' is not available in this version of the application");
+  handler(context, in, out);
+}
 
 }  // namespace client3::host

@@ -7,21 +7,12 @@
 #include <string>
 #include <string_view>
 
+#include "host/failure.h"
 #include "host/scene.h"
 #include "protocol/catalogue.h"
 #include "protocol/wire.h"
 
 namespace client3::host {
-
-// The result codes the application answers with.
-enum Status : std::int32_t { Ok = 0, Refused = 1003, BadFrame = 1004 };
-
-// A refusal: the code and the message the client receives.
-struct Failure {
-  Status status;
-  std::string message;
-};
-[[noreturn]] void Refuse(std::string message);
 
 // Test-only misbehaviour of the host, chosen on its command line.
 struct Faults {

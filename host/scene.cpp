@@ -1,22 +1,329 @@
-// The scene and the demonstration take.
+// The scene's object tree and the demonstration take.
 #include "host/scene.h"
 
+#include <algorithm>
+#include <atomic>
+#include <charconv>
 #include <cmath>
+#include <functional>
 
 namespace client3::host {
 
-Subject* Scene::FindSubject(std::string_view name) { return FindNamed(subjects, name); }
+ObjectId NewId() {
+  static std::atomic<ObjectId> next{1};
+  return next++;
+}
+
+// ---- Values and their text --------------------------------------------------------------------
+
+std::string_view ValueTypeName(ValueType type) {
+  switch (type) {
+    case ValueType::Bool: return "Bool";
+    case ValueType::Int: return "Int";
+    case ValueType::Float: return "Float";
+    case ValueType::String: return "String";
+    case ValueType::Vector: return "Vector";
+  }
+  return "";
+}
+
+std::string NumberText(double value) {
+  char buffer[64];
+  auto [end, error] = std::to_chars(buffer, buffer + sizeof buffer, value);
+  return std::string(buffer, error == std::errc() ? end : buffer);
+}
+
+std::optional<double> ParseDouble(std::string_view text) {
+  double value;
+  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
+  if (text.empty() || error != std::errc() || end != text.data() + text.size() || !std::isfinite(value)) return std::nullopt;
+  return value;
+}
+
+std::optional<std::int32_t> ParseInt(std::string_view text) {
+  std::int32_t value;
+  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
+  if (text.empty() || error != std::errc() || end != text.data() + text.size()) return std::nullopt;
+  return value;
+}
+
+std::optional<std::string> Canonical(ValueType type, std::string_view text) {
+  switch (type) {
+    case ValueType::Bool:
+      if (text == "true" || text == "1") return "true";
+      if (text == "false" || text == "0") return "false";
+      return std::nullopt;
+    case ValueType::Int:
+      if (auto v = ParseInt(text)) return std::to_string(*v);
+      return std::nullopt;
+    case ValueType::Float:
+      if (auto v = ParseDouble(text)) return NumberText(*v);
+      return std::nullopt;
+    case ValueType::String:
+      return std::string(text);
+    case ValueType::Vector: {
+      std::string out;
+      for (int i = 0; i < 3; ++i) {
+        std::size_t comma = i < 2 ? text.find(',') : text.size();
+        if (comma == std::string_view::npos) return std::nullopt;
+        auto v = ParseDouble(text.substr(0, comma));
+        if (!v) return std::nullopt;
+        out += (i ? "," : "") + NumberText(*v);
+        text = text.substr(std::min(comma + 1, text.size()));
+        if (i == 2 && comma != std::string_view::npos && !text.empty()) return std::nullopt;
+      }
+      return out;
+    }
+  }
+  return std::nullopt;
+}
+
+namespace {
+
+std::vector<double> VectorOf(const std::string& text) {
+  std::vector<double> v;
+  std::size_t from = 0;
+  for (int i = 0; i < 3; ++i) {
+    std::size_t comma = text.find(',', from);
+    v.push_back(ParseDouble(std::string_view(text).substr(from, comma - from)).value_or(0));
+    from = comma + 1;
+  }
+  return v;
+}
+
+}  // namespace
+
+// ---- Channels, objects ----------------------------------------------------------------------------
+
+void Channel::Resize(int frames) {
+  auto n = static_cast<std::size_t>(frames);
+  values.assign(n, 0), keys.assign(n, false), selected.assign(n, false);
+}
+
+template <class T, class Key>
+T* FindIn(std::vector<T>& list, Key key) {
+  for (T& item : list) {
+    if constexpr (std::is_same_v<Key, ObjectId>) {
+      if (item.id == key) return &item;
+    } else if (item.name == key) {
+      return &item;
+    }
+  }
+  return nullptr;
+}
+
+Attribute* Object::FindAttribute(std::string_view name) { return FindIn(attributes, name); }
+Attribute* Object::FindAttribute(ObjectId id) { return FindIn(attributes, id); }
+Channel* Object::FindChannel(std::string_view name) { return FindIn(channels, name); }
+Channel* Object::FindChannel(ObjectId id) { return FindIn(channels, id); }
+Parameter* Object::FindParameter(std::string_view name) { return FindIn(parameters, name); }
+Parameter* Object::FindParameter(ObjectId id) { return FindIn(parameters, id); }
+
+const std::string& Object::Text(std::string_view attribute) const {
+  for (const Attribute& a : attributes)
+    if (a.name == attribute) return a.value;
+  static const std::string none;
+  return none;
+}
+
+// ---- Time -------------------------------------------------------------------------------------------
+
+bool SupportedFrameRate(double rate) {
+  return rate >= 1 && rate <= kMaxFrameRate && rate == std::floor(rate) && kTicksPerSecond % static_cast<std::uint64_t>(rate) == 0;
+}
+
+std::uint64_t Timeline::Now() const {
+  if (!playing) return ticks;
+  auto elapsed = std::chrono::duration_cast<std::chrono::nanoseconds>(std::chrono::steady_clock::now() - playedFrom).count();
+  auto advanced = static_cast<std::uint64_t>(static_cast<double>(elapsed) * static_cast<double>(rate) / 1e9);
+  auto length = static_cast<std::uint64_t>(playEnd - playStart + 1);
+  auto offset = static_cast<std::uint64_t>(FrameAt(ticks) - playStart);
+  return TicksOf(playStart + static_cast<int>((offset + advanced) % length));
+}
+
+void Timeline::Set(std::uint64_t time) {
+  ticks = time;
+  playedFrom = std::chrono::steady_clock::now();
+}
+
+// ---- The tree -------------------------------------------------------------------------------------
+
+bool KnownType(std::string_view type) {
+  return std::find(std::begin(kObjectTypes), std::end(kObjectTypes), type) != std::end(kObjectTypes);
+}
+
+bool MayContain(std::string_view parent, std::string_view child) {
+  if (parent == "Scene") return child == "Subject" || child == "Camera" || child == "Clip" || child == "Null";
+  if (parent == "Subject") return child == "Marker" || child == "Bone" || child == "Constraint";
+  if (parent == "Bone") return child == "Bone" || child == "Null";
+  if (parent == "Null") return child == "Null";
+  return false;
+}
+
+std::string BadName(std::string_view name) {
+  if (name.empty()) return "a name cannot be empty";
+  for (char c : name)
+    if (c == '/' || static_cast<unsigned char>(c) < 0x20)
+      return "a name cannot hold '/' or control characters: '" + std::string(name) + "'";
+  return {};
+}
+
+Scene::Scene(int frameCount, std::string name) : frames(frameCount) {
+  Object root;
+  root.id = this->root = NewId();
+  root.type = "Scene";
+  root.name = std::move(name);
+  root.attributes.push_back({NewId(), "Name", ValueType::String, true, ""});
+  root.attributes.push_back({NewId(), "Type", ValueType::String, false, ""});
+  objects.emplace(root.id, std::move(root));
+  timeline.playEnd = timeline.animEnd = frames;
+  timeline.selected.assign(static_cast<std::size_t>(frames), false);
+}
+
+Object* Scene::Find(ObjectId id) {
+  auto found = objects.find(id);
+  return found == objects.end() ? nullptr : &found->second;
+}
+
+Object* Scene::Child(const Object& parent, std::string_view name) {
+  for (ObjectId child : parent.children)
+    if (Object& o = objects.at(child); o.name == name) return &o;
+  return nullptr;
+}
+
+std::string Scene::PathOf(ObjectId id) {
+  if (id == root) return "/";
+  std::string path;
+  for (Object* o = Find(id); o && o->id != root; o = Find(o->parent)) path = "/" + o->name + path;
+  return path;
+}
+
+Object* Scene::AtPath(std::string_view path) {
+  if (path.empty() || path[0] != '/') return nullptr;
+  Object* at = &Root();
+  path.remove_prefix(1);
+  while (at && !path.empty()) {
+    std::size_t slash = path.find('/');
+    at = Child(*at, path.substr(0, slash));
+    path = slash == std::string_view::npos ? std::string_view() : path.substr(slash + 1);
+    if (slash != std::string_view::npos && path.empty()) return nullptr;
+  }
+  return at;
+}
+
+std::vector<ObjectId> Scene::Descendants(ObjectId id) {
+  std::vector<ObjectId> out;
+  std::function<void(ObjectId)> walk = [&](ObjectId parent) {
+    for (ObjectId child : objects.at(parent).children) out.push_back(child), walk(child);
+  };
+  walk(id);
+  return out;
+}
+
+bool Scene::IsBelow(ObjectId id, ObjectId ancestor) {
+  for (Object* o = Find(id); o && o->parent; o = Find(o->parent))
+    if (o->parent == ancestor) return true;
+  return false;
+}
+
+Object& Scene::Add(ObjectId parent, std::string type, std::string name) {
+  Object o;
+  o.id = NewId();
+  o.parent = parent;
+  o.type = std::move(type);
+  o.name = std::move(name);
+  auto attribute = [&](std::string_view n, ValueType t, bool editable, std::string value) {
+    o.attributes.push_back({NewId(), std::string(n), t, editable, std::move(value)});
+  };
+  attribute("Name", ValueType::String, true, "");
+  attribute("Type", ValueType::String, false, "");
+  if (o.type == "Subject") {
+    attribute("Model", ValueType::String, true, o.name);
+    attribute("Active", ValueType::Bool, true, "true");
+  } else if (o.type == "Marker") {
+    for (const char* axis : {"X", "Y", "Z"}) {
+      Channel c;
+      c.id = NewId(), c.name = axis;
+      c.Resize(frames);
+      o.channels.push_back(std::move(c));
+    }
+  } else if (o.type == "Bone" || o.type == "Null" || o.type == "Camera") {
+    attribute("Translation", ValueType::Vector, true, "0,0,0");
+    attribute("WorldTranslation", ValueType::Vector, false, "");
+    if (o.type == "Camera") {
+      int device = 1;
+      for (Object* camera : OfType(Root(), "Camera")) device = std::max(device, std::stoi(camera->Text("DeviceID")) + 1);
+      attribute("DeviceID", ValueType::Int, false, std::to_string(device));
+      attribute("Enabled", ValueType::Bool, true, "true");
+    }
+  } else if (o.type == "Constraint") {
+    attribute("Active", ValueType::Bool, true, "true");
+    attribute("Source", ValueType::String, true, "");
+    attribute("Target", ValueType::String, true, "");
+    attribute("Offset", ValueType::Vector, true, "0,0,0");
+    attribute("ConstraintType", ValueType::String, true, "Point");
+  } else if (o.type == "Clip") {
+    attribute("Description", ValueType::String, true, "");
+  }
+  ObjectId id = o.id;
+  objects.at(parent).children.push_back(id);
+  return objects.emplace(id, std::move(o)).first->second;
+}
+
+void Scene::Remove(ObjectId id) {
+  std::vector<ObjectId> gone = Descendants(id);
+  gone.push_back(id);
+  auto& siblings = objects.at(objects.at(id).parent).children;
+  siblings.erase(std::find(siblings.begin(), siblings.end(), id));
+  for (ObjectId each : gone) {
+    objects.erase(each);
+    selection.erase(std::remove(selection.begin(), selection.end(), each), selection.end());
+    if (activeClip == each) activeClip = 0;
+  }
+}
+
+std::vector<double> Scene::WorldTranslation(ObjectId id) {
+  std::vector<double> sum(3, 0.0);
+  for (Object* o = Find(id); o; o = o->parent ? Find(o->parent) : nullptr)
+    if (o->FindAttribute("Translation")) {
+      std::vector<double> v = VectorOf(o->Text("Translation"));
+      for (int i = 0; i < 3; ++i) sum[i] += v[i];
+    }
+  return sum;
+}
+
+std::vector<Object*> Scene::OfType(const Object& parent, std::string_view type) {
+  std::vector<Object*> out;
+  for (ObjectId child : parent.children)
+    if (Object& o = objects.at(child); o.type == type) out.push_back(&o);
+  return out;
+}
+
+Object* Scene::FindSubject(std::string_view name) {
+  Object* o = Child(Root(), name);
+  return o && o->type == "Subject" ? o : nullptr;
+}
+
+std::vector<Object*> Scene::Bones(const Object& subject) {
+  std::vector<Object*> out;
+  std::function<void(const Object&)> walk = [&](const Object& parent) {
+    for (Object* bone : OfType(parent, "Bone")) out.push_back(bone), walk(*bone);
+  };
+  walk(subject);
+  return out;
+}
 
 Scene EmptyScene(int frames) {
-  Scene scene;
-  scene.name = "Untitled";
-  scene.frames = frames;
+  Scene scene(frames, "Untitled");
+  Object& clip = scene.Add(scene.root, "Clip", "Take");
+  scene.activeClip = clip.id;
   return scene;
 }
 
 namespace {
 
 constexpr double kPi = 3.14159265358979323846;
+constexpr double kDemoRate = 100;
 
 // Where each marker sits on the body (millimetres from the pelvis, standing), the bone it belongs to,
 // and how it swings while walking.
@@ -37,15 +344,18 @@ constexpr MarkerPlan kMarkers[] = {
     {"LANK", "LeftFoot", 0, 100, -880, 300, 0.0},  {"RANK", "RightFoot", 0, -100, -880, 300, kPi},
 };
 
+// Bones with their parent and their offset from it (millimetres, standing).
 struct BonePlan {
   const char* name;
   const char* parent;
+  double x, y, z;
 };
 constexpr BonePlan kBones[] = {
-    {"Pelvis", ""},          {"Thorax", "Pelvis"},      {"Head", "Thorax"},         {"LeftArm", "Thorax"},
-    {"LeftHand", "LeftArm"}, {"RightArm", "Thorax"},    {"RightHand", "RightArm"},  {"LeftThigh", "Pelvis"},
-    {"LeftShin", "LeftThigh"}, {"LeftFoot", "LeftShin"}, {"RightThigh", "Pelvis"},  {"RightShin", "RightThigh"},
-    {"RightFoot", "RightShin"},
+    {"Pelvis", "", 0, 0, 950},          {"Thorax", "Pelvis", 0, 0, 300},      {"Head", "Thorax", 0, 0, 300},
+    {"LeftArm", "Thorax", 0, 180, 200}, {"LeftHand", "LeftArm", 0, 50, -550}, {"RightArm", "Thorax", 0, -180, 200},
+    {"RightHand", "RightArm", 0, -50, -550}, {"LeftThigh", "Pelvis", 0, 100, 0}, {"LeftShin", "LeftThigh", 0, 0, -450},
+    {"LeftFoot", "LeftShin", 0, 0, -430}, {"RightThigh", "Pelvis", 0, -100, 0}, {"RightShin", "RightThigh", 0, 0, -450},
+    {"RightFoot", "RightShin", 0, 0, -430},
 };
 
 // Occlusions: marker index, first frame, length (in frames of a 1,000-frame take; scaled to others).
@@ -67,58 +377,72 @@ constexpr SubjectPlan kSubjects[] = {
     {"Bob", 1.82, -600, 1350, 0.85, {{10, 250, 20}, {3, 520, 4}, {8, 610, 45}, {6, 900, 15}}},
 };
 
-Subject MakeSubject(const SubjectPlan& plan, int frames, double rate) {
-  Subject subject;
-  subject.name = plan.name;
-  subject.model = "Walker";
+Parameter NumberParameter(const char* name, double value, double fallback, const char* unit, bool required) {
+  return {NewId(), name, ParameterKind::Number, NumberText(static_cast<float>(value)), NumberText(static_cast<float>(fallback)), unit, required};
+}
+
+void AddSubject(Scene& scene, const SubjectPlan& plan) {
+  int frames = scene.frames;
+  Object& subject = scene.Add(scene.root, "Subject", plan.name);
+  ObjectId subjectId = subject.id;
+  subject.FindAttribute("Model")->value = "Walker";
   double scale = plan.height / 1.75;
   double hip = 950 * scale;
+  std::vector<ObjectId> markers;
   for (const MarkerPlan& m : kMarkers) {
-    Marker marker;
-    marker.name = m.name;
-    marker.x.resize(frames), marker.y.resize(frames), marker.z.resize(frames);
-    marker.e.assign(frames, true);
+    Object& marker = scene.Add(subjectId, "Marker", m.name);
+    markers.push_back(marker.id);
+    Channel &x = marker.channels[0], &y = marker.channels[1], &z = marker.channels[2];
     for (int f = 0; f < frames; ++f) {
-      double t = f / rate;
+      double t = f / kDemoRate;
       double cycle = 2 * kPi * plan.cadence * t + m.phase;
-      marker.x[f] = -2000 + plan.speed * t + m.x * scale + m.swing * scale * std::sin(cycle);
-      marker.y[f] = plan.lane + m.y * scale + 15 * std::sin(cycle / 2);
-      marker.z[f] = hip + m.z * scale + 20 * std::abs(std::sin(cycle)) ;
+      auto i = static_cast<std::size_t>(f);
+      x.SetKey(i, -2000 + plan.speed * t + m.x * scale + m.swing * scale * std::sin(cycle));
+      y.SetKey(i, plan.lane + m.y * scale + 15 * std::sin(cycle / 2));
+      z.SetKey(i, hip + m.z * scale + 20 * std::abs(std::sin(cycle)));
     }
-    subject.markers.push_back(std::move(marker));
   }
   for (const GapPlan& gap : plan.gaps) {
-    Marker& marker = subject.markers[gap.marker];
+    Object& marker = scene.objects.at(markers[static_cast<std::size_t>(gap.marker)]);
     long first = static_cast<long>(gap.first) * frames / 1000;
     long length = std::max(1L, static_cast<long>(gap.length) * frames / 1000);
-    for (long f = first; f < first + length && f < frames; ++f) {
-      marker.e[f] = false;
-      marker.x[f] = marker.y[f] = marker.z[f] = 0;
-    }
+    for (long f = first; f < first + length && f < frames; ++f)
+      for (Channel& c : marker.channels) c.DeleteKey(static_cast<std::size_t>(f)), c.values[static_cast<std::size_t>(f)] = 0;
   }
-  for (const BonePlan& b : kBones) subject.bones.push_back({b.name, b.parent, {}});
-  for (Bone& bone : subject.bones)
-    if (Bone* parent = FindNamed(subject.bones, bone.parent)) parent->children.push_back(bone.name);
+  for (const BonePlan& b : kBones) {
+    ObjectId parentId = subjectId;
+    for (Object* bone : scene.Bones(scene.objects.at(subjectId)))
+      if (bone->name == b.parent) parentId = bone->id;
+    Object& bone = scene.Add(parentId, "Bone", b.name);
+    bone.FindAttribute("Translation")->value = NumberText(b.x * scale) + "," + NumberText(b.y * scale) + "," + NumberText(b.z * scale);
+  }
   for (const MarkerPlan& m : kMarkers) {
-    float offset[3] = {static_cast<float>(m.x * scale / 4), static_cast<float>(m.y * scale / 4), 0};
-    subject.constraints.push_back(
-        {std::string(m.name) + "_" + m.bone, true, m.name, m.bone, {offset, offset + 3}, "Point"});
+    Object& c = scene.Add(subjectId, "Constraint", std::string(m.name) + "_" + m.bone);
+    c.FindAttribute("Source")->value = m.name;
+    c.FindAttribute("Target")->value = m.bone;
+    c.FindAttribute("Offset")->value = NumberText(static_cast<float>(m.x * scale / 4)) + "," + NumberText(static_cast<float>(m.y * scale / 4)) + ",0";
   }
-  subject.parameters = {
-      {"Height", static_cast<float>(plan.height * 1000), 1750, "mm", true},
-      {"Mass", static_cast<float>(plan.height * 40), 70, "kg", true},
-      {"LeftLegLength", static_cast<float>(hip), 900, "mm", false},
-      {"RightLegLength", static_cast<float>(hip), 900, "mm", false},
+  scene.objects.at(subjectId).parameters = {
+      NumberParameter("Height", plan.height * 1000, 1750, "mm", true),
+      NumberParameter("Mass", plan.height * 40, 70, "kg", true),
+      NumberParameter("LeftLegLength", hip, 900, "mm", false),
+      NumberParameter("RightLegLength", hip, 900, "mm", false),
   };
-  return subject;
 }
 
 }  // namespace
 
 Scene DemoScene(int frames) {
-  Scene scene = EmptyScene(frames);
-  scene.name = "Demo";
-  for (const SubjectPlan& plan : kSubjects) scene.subjects.push_back(MakeSubject(plan, frames, scene.rate));
+  Scene scene(frames, "Demo");
+  for (const SubjectPlan& plan : kSubjects) AddSubject(scene, plan);
+  const double corners[4][2] = {{4000, 3000}, {4000, -3000}, {-4000, -3000}, {-4000, 3000}};
+  for (int i = 0; i < 4; ++i) {
+    Object& camera = scene.Add(scene.root, "Camera", "Camera" + std::to_string(i + 1));
+    camera.FindAttribute("Translation")->value = NumberText(corners[i][0]) + "," + NumberText(corners[i][1]) + ",2500";
+  }
+  Object& clip = scene.Add(scene.root, "Clip", "Walk");
+  clip.FindAttribute("Description")->value = "Two subjects walking side by side";
+  scene.activeClip = clip.id;
   return scene;
 }
 

@@ -1,71 +1,172 @@
-// The application's scene: one take of motion-capture data with its subjects, their markers'
-// trajectories, skeletons and parameters.
+// The application's scene: one take of motion-capture data held as a tree of objects.
+//
+// Every item of the scene is an object: the scene itself (the root), subjects, their markers, bones
+// and constraints, cameras, clips, and plain objects that scripts create. An object has an id that
+// is never used again within the application's life, a type, a name unique among its siblings, a
+// parent and children, typed attributes, animation channels with keys, and parameters. Attributes,
+// channels and parameters have ids from the same counter.
+//
+// A marker's trajectory is its channels X, Y and Z: a frame where all three hold a key is a frame
+// where the marker was seen. A subject's parameters of kind Number are its subject parameters.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <string_view>
+#include <unordered_map>
 #include <vector>
 
 namespace client3::host {
 
-// Frames are numbered from 1 to the take's frame count.
-struct Marker {
+using ObjectId = std::uint64_t;
+
+// The next id of the application's life: 1, 2, 3, ...
+ObjectId NewId();
+
+// The types of attribute values and their text forms.
+enum class ValueType : std::int32_t {
+  Bool = 0,    // "true" or "false" ("1" and "0" accepted)
+  Int = 1,     // a signed 32-bit decimal number
+  Float = 2,   // a 64-bit floating-point number in its shortest exact form
+  String = 3,  // any text
+  Vector = 4,  // three Floats separated by commas
+};
+std::string_view ValueTypeName(ValueType type);
+// The canonical text of a value of `type` written as `text`; nothing when it is not one.
+std::optional<std::string> Canonical(ValueType type, std::string_view text);
+// A number in its shortest form that reads back exactly.
+std::string NumberText(double value);
+std::optional<double> ParseDouble(std::string_view text);
+std::optional<std::int32_t> ParseInt(std::string_view text);
+
+struct Attribute {
+  ObjectId id = 0;
   std::string name;
-  std::vector<double> x, y, z;  // millimetres; 0 where the marker was not seen
-  std::vector<bool> e;          // whether the marker was seen at each frame
+  ValueType type = ValueType::String;
+  bool editable = true;
+  std::string value;  // canonical text; Name, Type and WorldTranslation are read from the object
 };
 
-struct Bone {
+// A scalar animated value: one slot per frame of the take, each holding a key or not.
+struct Channel {
+  ObjectId id = 0;
   std::string name;
-  std::string parent;  // empty for the root
-  std::vector<std::string> children;
+  std::vector<double> values;  // the key's value where keys[i]; elsewhere what was last written there
+  std::vector<bool> keys;
+  std::vector<bool> selected;  // key selection; only frames with a key are selected
+  double fallback = 0;         // the value read where there is no key to read from
+
+  void Resize(int frames);
+  void SetKey(std::size_t frame, double value) { values[frame] = value, keys[frame] = true; }
+  void DeleteKey(std::size_t frame) { keys[frame] = false, selected[frame] = false; }
 };
 
-struct Constraint {
-  std::string name;
-  bool active = true;
-  std::string source, target;  // a marker and the bone it is attached to
-  std::vector<float> offset;   // the marker's position in the bone's frame, millimetres
-  std::string type;            // "Point", "Aim" or "Orient"
-};
+enum class ParameterKind : std::int32_t { Any = 0, Number = 1, Text = 2 };
 
-struct SubjectParameter {
+struct Parameter {
+  ObjectId id = 0;
   std::string name;
-  float value = 0, fallback = 0;
+  ParameterKind kind = ParameterKind::Number;
+  std::string value, fallback;  // canonical text: Floats for Number parameters
   std::string unit;
   bool required = false;
 };
 
-struct Subject {
+struct Object {
+  ObjectId id = 0;
+  std::string type;
   std::string name;
-  std::string model;  // the subject's template; also the name of its skeleton
-  bool active = true;
-  std::vector<Marker> markers;
-  std::vector<Bone> bones;
-  std::vector<Constraint> constraints;
-  std::vector<SubjectParameter> parameters;
+  ObjectId parent = 0;  // 0 for the scene root
+  std::vector<ObjectId> children;
+  std::vector<Attribute> attributes;
+  std::vector<Channel> channels;
+  std::vector<Parameter> parameters;
+
+  Attribute* FindAttribute(std::string_view name);
+  Attribute* FindAttribute(ObjectId id);
+  Channel* FindChannel(std::string_view name);
+  Channel* FindChannel(ObjectId id);
+  Parameter* FindParameter(std::string_view name);
+  Parameter* FindParameter(ObjectId id);
+  // The stored text of an attribute this object certainly has.
+  const std::string& Text(std::string_view attribute) const;
+};
+
+// Time: ticks, seconds and frames are views of one current time. Frame 1 is at time 0.
+inline constexpr std::uint64_t kTicksPerSecond = 705'600'000;
+inline constexpr int kMaxFrameRate = 10'000;
+// Whether `rate` frames per second can be played with a whole number of ticks per frame.
+bool SupportedFrameRate(double rate);
+// The time-code standards, by name.
+inline constexpr std::string_view kTimeCodeStandards[] = {"Film", "PAL", "NTSC", "NTSCDrop", "HD50", "HD60"};
+
+struct Timeline {
+  int rate = 100;
+  std::uint64_t ticks = 0;  // the current time while stopped, the time playback started from while playing
+  int playStart = 1, playEnd = 1, animStart = 1, animEnd = 1;
+  std::string standard = "PAL";
+  bool playing = false;
+  std::chrono::steady_clock::time_point playedFrom;
+  std::vector<bool> selected;  // frames of the take that are selected
+
+  std::uint64_t TicksPerFrame() const { return kTicksPerSecond / static_cast<std::uint64_t>(rate); }
+  // The current time: while playing, moved on by the time that has passed, frame by frame through
+  // the play range and round again.
+  std::uint64_t Now() const;
+  int FrameAt(std::uint64_t time) const { return static_cast<int>(time / TicksPerFrame()) + 1; }
+  std::uint64_t TicksOf(int frame) const { return static_cast<std::uint64_t>(frame - 1) * TicksPerFrame(); }
+  // Sets the current time (playback, if on, goes on from there).
+  void Set(std::uint64_t time);
 };
 
 struct Scene {
-  std::string name;
-  std::string path;
+  std::string path;  // the file it was loaded from or saved to
   int frames = 0;
-  double rate = 100.0;
-  std::vector<Subject> subjects;
+  ObjectId root = 0;
+  std::unordered_map<ObjectId, Object> objects;
+  std::vector<ObjectId> selection;  // in the order the objects were selected
+  ObjectId activeClip = 0;
+  Timeline timeline;
 
-  Subject* FindSubject(std::string_view name);
+  explicit Scene(int frames = 1, std::string name = "Untitled");
+
+  Object& Root() { return objects.at(root); }
+  const std::string& Name() const { return objects.at(root).name; }
+  Object* Find(ObjectId id);
+  Object* Child(const Object& parent, std::string_view name);
+  std::string PathOf(ObjectId id);
+  // "/" is the root, "/Alice/LFHD" a marker; an empty path names nothing.
+  Object* AtPath(std::string_view path);
+  // The objects below `id`, parents before their children, siblings in order.
+  std::vector<ObjectId> Descendants(ObjectId id);
+  bool IsBelow(ObjectId id, ObjectId ancestor);
+
+  // Adds an object with the standard attributes and channels of its type; the caller has checked
+  // the name and the parent.
+  Object& Add(ObjectId parent, std::string type, std::string name);
+  // Removes an object with its descendants (never the root).
+  void Remove(ObjectId id);
+  // Sum of the Translation attributes from the root down to the object.
+  std::vector<double> WorldTranslation(ObjectId id);
+
+  // The subjects and their parts, in order.
+  std::vector<Object*> OfType(const Object& parent, std::string_view type);
+  Object* FindSubject(std::string_view name);
+  std::vector<Object*> Bones(const Object& subject);  // the skeleton, parents before children
 };
+
+// The types of objects, and which may be the child of which.
+inline constexpr std::string_view kObjectTypes[] = {"Scene", "Subject", "Marker", "Bone", "Constraint", "Camera", "Clip", "Null"};
+bool KnownType(std::string_view type);
+bool MayContain(std::string_view parentType, std::string_view childType);
+// Why `name` cannot name an object; empty when it can.
+std::string BadName(std::string_view name);
+inline constexpr std::string_view kConstraintTypes[] = {"Point", "Aim", "Orient"};
 
 // The demonstration take: deterministic, smooth trajectories with a few occlusion gaps.
 Scene DemoScene(int frames);
 Scene EmptyScene(int frames);
-
-template <class T>
-T* FindNamed(std::vector<T>& list, std::string_view name) {
-  for (T& item : list)
-    if (item.name == name) return &item;
-  return nullptr;
-}
 
 }  // namespace client3::host

@@ -216,7 +216,7 @@ int Serve(const Options& options, Scene& scene, const std::atomic<bool>& stop) {
   bool v6 = options.host.find(':') != std::string::npos;
   std::printf("listening on %s%s%s:%d\n", v6 ? "[" : "", options.host.c_str(), v6 ? "]" : "", listener.LocalPort());
   std::fflush(stdout);
-  LogLine("info", "serving scene '" + scene.name + "' of " + std::to_string(scene.frames) + " frames");
+  LogLine("info", "serving scene '" + scene.Name() + "' of " + std::to_string(scene.frames) + " frames");
 
   Shared shared{scene, {}, options};
   std::list<Client> clients;
