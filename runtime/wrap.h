@@ -151,6 +151,13 @@ template <class T>
 PyObject* ToPython(const T& value) {
   return ToPython(Owned<T>{new T(value)});
 }
+// A record returned by a call is moved to the heap rather than copied: its vectors change owner
+// without being allocated and filled a second time.
+template <class T>
+  requires(TypeOf<T> != TypeCount && !std::is_reference_v<T>)
+PyObject* ToPython(T&& value) {
+  return ToPython(Owned<T>{new T(std::move(value))});
+}
 
 // The last resort for native exceptions that a target lets escape: they become the nearest
 // interpreter exception rather than being let through the interpreter's frames.
