@@ -1,5 +1,7 @@
 """The container protocol of the six vector types, table-driven over the instances."""
+import ctypes
 import gc
+import resource
 import weakref
 
 import pytest
@@ -133,6 +135,17 @@ def test_index_access(inst, index, position):
 
 
 @by_instance
+@pytest.mark.parametrize("index", [0, -1])
+def test_no_element_in_an_empty_vector(inst, index):
+    v = inst.make()
+    inst.fn("clear")(v)  # its storage stays: a read past the end would answer rather than fault
+    raises(IndexError, "index out of range", inst.fn("__getitem__"), v, index)
+    raises(IndexError, "index out of range", inst.fn("__setitem__"), v, index, inst.samples[0])
+    raises(IndexError, "index out of range", inst.fn("__delitem__"), v, index)
+    assert inst.fn("size")(v) == 0
+
+
+@by_instance
 def test_append(inst):
     for name in ("append", "push_back"):
         v = inst.new()
@@ -179,8 +192,50 @@ def test_swap_assign_resize_reserve_clear(inst):
     assert inst.read(v) == [inst.samples[1]] * 3 + [inst.samples[0], default, default]
     assert inst.fn("reserve")(v, 100) is None and inst.fn("capacity")(v) >= 100
     assert inst.fn("clear")(v) is None and inst.fn("size")(v) == 0
-    if not inst.packed:  # so many elements cannot fit a 32-bit process
-        pytest.raises(MemoryError, inst.fn("reserve"), v, 2**32 - 1)
+
+
+@pytest.fixture(scope="module")
+def bounded_growth():
+    """Vectors made by scripts are never freed, so a count taken by mistake would keep its gigabytes for the
+    rest of the run: from here on, the process may grow by 3 GB at most."""
+    soft, hard = resource.getrlimit(resource.RLIMIT_AS)
+    with open("/proc/self/statm") as statm:
+        size = int(statm.read().split()[0]) * resource.getpagesize()
+    limit = size + 3 * 2**30
+    resource.setrlimit(resource.RLIMIT_AS, (limit if hard == resource.RLIM_INFINITY else min(limit, hard), hard))
+    yield
+    resource.setrlimit(resource.RLIMIT_AS, (soft, hard))
+
+
+def test_no_count_of_bits_is_too_large():
+    v = m.new_vectorb()
+    assert m.vectorb_reserve(v, 2**32 - 1) is None and m.vectorb_capacity(v) >= 2**32 - 1
+
+
+# The bytes of one element; the packed bits have no count whose bytes fail to fit.
+ELEMENT_BYTES = {"vectord": 8, "vectorf": 4, "vectori": 4, "vectorull": 8, "vectorss": 3 * ctypes.sizeof(ctypes.c_void_p)}
+
+
+# Every function that takes a count: its arguments after self, given an iterator at the vector's begin,
+# the count and an element.
+@pytest.mark.parametrize("inst", [i for i in INSTANCES if not i.packed], ids=lambda inst: inst.prefix)
+@pytest.mark.parametrize("member, arguments", [
+    ("new", lambda at, n, x: (n,)),
+    ("new", lambda at, n, x: (n, x)),
+    ("resize", lambda at, n, x: (n,)),
+    ("resize", lambda at, n, x: (n, x)),
+    ("reserve", lambda at, n, x: (n,)),
+    ("assign", lambda at, n, x: (n, x)),
+    ("insert", lambda at, n, x: (at, n, x)),
+    ("insert", lambda at, n, x: (at, n - 5, x)),  # fits alone, but not with the five already there
+], ids=["new n", "new n x", "resize n", "resize n x", "reserve", "assign", "insert", "insert beside"])
+def test_counts_whose_bytes_do_not_fit_a_32_bit_process(bounded_growth, inst, member, arguments):
+    """The smallest count too large in bytes is refused before anything is allocated."""
+    v = inst.make()
+    capacity = inst.fn("capacity")(v)
+    args = arguments(inst.fn("begin")(v), 0x7FFFFFFF // ELEMENT_BYTES[inst.prefix] + 1, inst.samples[1])
+    pytest.raises(MemoryError, inst.fn(member), *(args if member == "new" else (v, *args)))
+    assert inst.read(v) == inst.samples and inst.fn("capacity")(v) == capacity
 
 
 @by_instance
@@ -242,6 +297,16 @@ def test_erase_and_insert_with_iterators(inst):
     assert inst.read(v) == s[3:] + [s[0]] * 2 and inst.value(m.SwigPyIterator_value(at)) == s[3]
     inst.fn("erase")(v, inst.fn("iterator")(v))  # a closed iterator is a forward position too
     assert inst.read(v) == s[4:] + [s[0]] * 2
+
+
+@by_instance
+@pytest.mark.parametrize("size, at", [(5, 0), (5, 2), (5, 5), (0, 0)], ids=["start", "middle", "end", "empty"])
+def test_erasing_an_empty_range(inst, size, at):
+    v = inst.make(inst.samples[:size])
+    position = m.SwigPyIterator___add__(inst.fn("begin")(v), at)
+    left = inst.fn("erase")(v, position, m.SwigPyIterator_copy(position))
+    assert inst.read(v) == inst.samples[:size]
+    assert m.SwigPyIterator_distance(inst.fn("begin")(v), left) == at
 
 
 @pytest.mark.parametrize("member", ["__getitem__", "front", "back"])
