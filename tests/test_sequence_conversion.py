@@ -1,4 +1,7 @@
 """Script sequences and vector proxies where a whole vector is expected."""
+import collections
+import sys
+
 import pytest
 
 import _Client3 as m
@@ -37,6 +40,30 @@ class Fickle(Sequence):
     def __getitem__(self, index):
         self.reads += index == 1
         return "text" if index == 1 and self.reads > 1 else self.items[index]
+
+
+class Recorded(Exception):
+    """Keeps the text of every exception of its kind that is made."""
+
+    texts = []
+
+    def __init__(self, text):
+        super().__init__(text)
+        self.texts.append(text)
+
+
+class Withdrawn(Sequence):
+    """Its element `gone` reads well once; read again, it raises Recorded."""
+
+    def __init__(self, items, gone):
+        super().__init__(items)
+        self.gone, self.reads = gone, 0
+
+    def __getitem__(self, index):
+        self.reads += index == self.gone
+        if index == self.gone and self.reads > 1:
+            raise Recorded("gone")
+        return self.items[index]
 
 
 class Failing(Sequence):
@@ -118,8 +145,10 @@ def test_length_is_asked_again_before_every_element():
     assert [m.vectord___getitem__(v, i) for i in range(m.vectord_size(v))] == [1.0, 2.0, 3.0, 4.0, 5.0]
 
 
-@pytest.mark.parametrize("prefix, source", [("vectord", lambda: Fickle([1.0, 2.0, 3.0])), ("vectorss", lambda: ["\ud800"])],
-                         ids=["changing sequence", "unencodable text"])
+@pytest.mark.parametrize("prefix, source", [
+    ("vectord", lambda: Fickle([1.0, 2.0, 3.0])),
+    ("vectorss", lambda: ["\ud800"]),
+], ids=["changing sequence", "unencodable text"])
 def test_element_that_fails_only_in_conversion_is_reported_against_the_argument(prefix, source):
     inst = next(i for i in INSTANCES if i.prefix == prefix)
     v = inst.make()
@@ -127,3 +156,40 @@ def test_element_that_fails_only_in_conversion_is_reported_against_the_argument(
         raises(TypeError, f"in method '{name}', argument {position} of type '{spelling}'",
                getattr(m, name), *before, source())
     assert inst.read(v) == inst.samples
+
+
+@pytest.mark.parametrize("gone", [0, 2, 4])
+def test_the_element_that_failed_is_named_by_its_position(gone):
+    """The position is added to the element's error on its way out. The argument's message then replaces that
+    error, so only an exception class of the script's own sees the texts added to it."""
+    Recorded.texts.clear()
+    try:
+        raise LookupError  # while one is handled, every exception raised is made at once, and so seen by Recorded
+    except LookupError:
+        raises(TypeError, "in method 'new_vectord', argument 1 of type 'std::vector< double > const &'",
+               m.new_vectord, Withdrawn([0.5] * 5, gone))
+    added = f"gone in sequence element {gone} "
+    assert Recorded.texts == ["gone", added, added + " bad type"]
+
+
+ITEMS = [float(i) + 0.5 for i in range(5)]  # objects of this test alone, so their counts are its own
+REFUSED = "refused"
+
+
+@pytest.mark.parametrize("source, accepted", [
+    (lambda: range(200, 205), True),  # small integers: the same objects at every reading
+    (lambda: collections.deque(ITEMS), True),
+    (lambda: Sequence(ITEMS), True),
+    (lambda: collections.deque(ITEMS[:2] + [REFUSED] + ITEMS[2:]), False),  # refused part-way by the check
+    (lambda: Sequence(ITEMS[:2] + [REFUSED] + ITEMS[2:]), False),
+    (lambda: Fickle(ITEMS), False),  # refused part-way by the conversion
+], ids=["range", "deque", "sequence", "deque refused", "sequence refused", "sequence refused late"])
+def test_elements_read_from_a_sequence_are_released(source, accepted):
+    items = list(range(200, 205)) + ITEMS + [REFUSED, "text"]  # "text": what Fickle's element 1 turns into
+    before = [sys.getrefcount(item) for item in items]
+    for _ in range(100):
+        if accepted:
+            assert m.vectord_size(m.new_vectord(source())) == 5
+        else:
+            pytest.raises(TypeError, m.new_vectord, source())
+    assert [sys.getrefcount(item) for item in items] == before
