@@ -1,7 +1,10 @@
 """The type registry: descriptors, cast lists, registration of classes, instance initialisation,
 pointer conversion, the lookups by name, and the type ring shared with a second module of the family."""
 import ctypes
+import gc
+import random
 import sys
+import weakref
 
 import pytest
 
@@ -58,6 +61,24 @@ def test_conversion_through_a_cast_moves_the_entry_to_the_front(peer):
     assert peer.casts(OUTPUT_RESULT) == casts
 
 
+def test_records_of_many_kinds_pass_as_their_base_in_any_order(peer):
+    """Each conversion reorders the base's cast list; every answer stays right, and the list keeps every entry."""
+    kinds = ["GetTrajectory", "GetFloat", "ReconstructSettings", "ProcessRequest", "GetObjectList", "Result"]
+    records = {kind: peer.record(OUTPUT_RESULT if kind == "Result" else record(kind)) for kind in kinds}
+    for number, kind in enumerate(kinds):
+        _Client3.Output_Result_Result_set(records[kind], 100 + number)
+    casts = sorted(peer.casts(OUTPUT_RESULT))
+    orders = [kinds, kinds[::-1], kinds[:2] * 5, [k for k in kinds for _ in range(3)], kinds[::2] + kinds[1::2],
+              random.Random(7).choices(kinds, k=300)]
+    unrelated = _Client3.new_Type_Parameter()
+    for order in orders:
+        for kind in order:
+            assert _Client3.Output_Result_Result_get(records[kind]) == 100 + kinds.index(kind), kind
+        raises(TypeError, "in method 'Output_Result_Result_get', argument 1 of type 'ZarvoSDKClientCPP::Output_Result *'",
+               _Client3.Output_Result_Result_get, unrelated)
+    assert sorted(peer.casts(OUTPUT_RESULT)) == casts
+
+
 # (object: a proxy made of a type given as [name], or a plain object; target; flags) -> code. There are
 # no down-casts, and no target accepts any proxy.
 @pytest.mark.parametrize("made, target, flags, code", [
@@ -104,6 +125,25 @@ def test_implicit_conversion_builds_the_target_class(peer):
     assert peer.convert(5, SAFE_STRING, IMPLICIT) == (-1, None, 0)  # the class refused it: no error kept
     assert peer.convert(None, SAFE_STRING, IMPLICIT) == (0, None, 0)
     assert peer.convert(5, "_p_int", IMPLICIT)[0] == -1  # no class registered
+
+
+def test_objects_made_by_an_implicit_conversion_are_released(peer, safe_string_class):
+    made = weakref.WeakSet()
+
+    class Counted:
+        """Made from a text: with a proxy of the target type, of another type, or of none."""
+
+        def __init__(self, text):
+            made.add(self)
+            if text != "no proxy":
+                self.this = peer.make(SAFE_STRING if text == "target" else TYPE_PARAMETER, 0x10, NO_SHADOW)
+
+    _Client3.SafeString_swigregister(Counted)
+    for text, code in (("target", 512), ("other type", -1), ("no proxy", -1)):
+        for _ in range(50):
+            assert peer.convert(text, SAFE_STRING, IMPLICIT)[0] == code
+        gc.collect()
+        assert len(made) == 0, text
 
 
 # ---- Registration -------------------------------------------------------------------------------
