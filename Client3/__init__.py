@@ -262,12 +262,24 @@ def _method(function: Callable[..., Any], name: str) -> Callable[..., Any]:
     return method
 
 
+class ParameterVector:
+    """A record's parameter list. It has no operations of its own: it is passed back to
+    ProcessRequest, which reads it through `this`; it keeps its record alive while it is held."""
+
+    def __init__(self, proxy: Any, record: Any) -> None:
+        self.this = proxy
+        self._record = record
+
+
 def _field(getter: Callable[..., Any], setter: Callable[..., Any], name: str) -> property:
     def get(self: Any) -> Any:
         value = getter(self)
         # A text or vector field points into the record: keep the record while it is in use.
-        if hasattr(value, "__dict__") and not value.this.own():
-            value.__dict__.setdefault("_record", self)
+        if hasattr(value, "__dict__"):
+            if not value.this.own():
+                value.__dict__.setdefault("_record", self)
+        elif value is not None and not isinstance(value, (int, float, bool)):
+            value = ParameterVector(value, self)
         return value
 
     def put(self: Any, value: Any) -> None:

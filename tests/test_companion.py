@@ -199,6 +199,20 @@ def test_a_field_keeps_its_record_alive(client):
     assert [str(name) for name in names] == ["Alice", "Bob"]
 
 
+def test_a_parameter_list_keeps_its_record_alive(host):
+    script = f"""
+import gc, Client3
+with Client3.connect({host.address!r}, {host.port}) as client:
+    inputs = client.GetCommandInfo("GetMarkerNames").check().InputParameters
+    gc.collect()
+    client.GetCommandList(), client.GetCommandInfo("GetTrajectory")  # reuse the freed memory, if any
+    reply = client.ProcessRequest("GetMarkerNames", inputs)
+    print(reply.Result, reply.ResultString)
+"""
+    code, out, err = run_python(script)
+    assert (code, out) == (0, "1003 no subject named ''\n"), err
+
+
 def test_results_and_errors(client):
     good = client.GetMarkerNames("Alice")
     bad = client.GetMarkerNames("Carol")
