@@ -220,8 +220,9 @@ public:
   void Get(std::vector<T>& out) {
     Expect(TypeOf<std::vector<T>>::value);
     std::uint32_t count = Count(sizeof(T));
+    const char* bytes = Take(count * sizeof(T));
     out.resize(count);
-    std::memcpy(out.data(), Take(count * sizeof(T)), count * sizeof(T));
+    if (count) std::memcpy(out.data(), bytes, count * sizeof(T));
   }
   void Get(std::vector<bool>& out) {
     Expect(Type::Bools);

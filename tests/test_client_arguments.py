@@ -11,7 +11,7 @@ import types
 import pytest
 
 import _Client3 as m
-from conftest import raises
+from conftest import needs_plain_allocator, raises
 
 NS = "ZarvoSDKClientCPP::"
 CLIENT = NS + "ZarvoPelluxPostClient"
@@ -468,6 +468,7 @@ def test_set_trajectory_takes_lists_tuples_and_vectors(client, values):
     assert m.vectorb_size(vectorb) == 1 and m.vectorb___getitem__(vectorb, 0) is True
 
 
+@needs_plain_allocator
 def test_set_trajectory_refused_sixth_argument_leaves_no_temporary(client):
     x, y = [float(i) for i in range(100_000)], list(range(100_000))  # copied into 800 kB temporaries each call
     expected = refusal("SetTrajectory", 6, TypeError)
@@ -532,6 +533,7 @@ def test_delete_disowns_the_proxy():
     assert m.delete_ZarvoPelluxPostClient(proxy) is None and proxy.own() is False
 
 
+@needs_plain_allocator
 def test_delete_destroys_a_client_its_proxy_does_not_own():
     def churn(times):
         for _ in range(times):
