@@ -11,6 +11,7 @@
 #include <string>
 #include <string_view>
 
+#include "host/scenefile.h"
 #include "host/server.h"
 #include "platform/net.h"
 
@@ -88,8 +89,13 @@ int main(int argc, char** argv) {
     scene = DemoScene(options.frames);
   else if (options.scene == "empty")
     scene = EmptyScene(options.frames);
-  else
-    return Usage("scene files cannot be opened by this version of the application");
+  else {
+    try {
+      scene = LoadScene(options.scene);
+    } catch (const Failure& failure) {
+      return Usage(failure.message.c_str());
+    }
+  }
   client3::platform::OnStopRequest(RequestStop);
   return Serve(options, scene, stopRequested);
 }

@@ -40,6 +40,8 @@ class Client:
 
     def _run(self, operation, *args):
         record = self.record(operation, *args)
+        if not type(record).__name__.startswith("Output_"):
+            return record  # an operation that answers with a plain value
         code = m.Output_Result_Result_get(record)
         if code != m.Success:
             raise ApplicationError(code, m.SafeString_Value(m.Output_Result_ResultString_get(record)))
