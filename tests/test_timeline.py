@@ -1,0 +1,111 @@
+"""The timeline of real hosts: one current time seen in ticks, seconds and frames, the ranges and
+their order, time-code standards, frame rates, playback and the selected ranges."""
+import time
+
+import _Client3 as m
+import pytest
+
+from appclient import Client
+
+TICKS_PER_SECOND = 705_600_000
+
+
+@pytest.fixture
+def app(start_host):
+    client = Client(start_host("--frames", "600"))
+    yield client
+    client.close()
+
+
+@pytest.mark.parametrize("rate", [1, 24, 25, 30, 48, 50, 60, 90, 100, 120, 240, 250, 500, 1000, 2000])
+def test_ticks_seconds_and_frames_are_one_time(app, rate):
+    app.TimelineSetFrameRate(float(rate))
+    per_frame = TICKS_PER_SECOND // rate
+    for frame in (1, 2, 299, 600):
+        app.TimelineSetFrames(frame)
+        assert app.TimelineGetTicks() == (frame - 1) * per_frame
+        seconds = app.TimelineGetSecs()
+        app.TimelineSetFrames(1)
+        app.TimelineSetSecs(seconds)
+        assert app.TimelineGetFrames() == frame
+        app.TimelineSetTicks((frame - 1) * per_frame)
+        assert app.TimelineGetFrames() == frame
+
+
+def test_a_frame_rate_change_keeps_the_time(app):
+    app.TimelineSetFrames(201)  # 2 s at 100 frames a second
+    app.TimelineSetFrameRate(25.0)
+    assert app.TimelineGetFrameRate() == 25.0
+    assert app.TimelineGetTicks() == 2 * TICKS_PER_SECOND and app.TimelineGetFrames() == 51
+
+
+@pytest.mark.parametrize("rate", [0.0, 23.976, 9999.0, 20000.0, -25.0])
+def test_unsupported_frame_rates_are_refused(app, rate):
+    code, message = app.refusal("TimelineSetFrameRate", rate)
+    assert code == m.ApplicationError and message.startswith("a frame rate must be a whole number")
+    assert app.TimelineGetFrameRate() == 100.0
+
+
+@pytest.mark.parametrize("operation, frame", [("TimelineSetPlayStart", 300), ("TimelineSetPlayEnd", 100),
+                                              ("TimelineSetAnimStart", 300), ("TimelineSetAnimEnd", 100)])
+def test_range_order_is_kept(app, operation, frame):
+    app.TimelineSetPlayStart(150), app.TimelineSetPlayEnd(250)
+    app.TimelineSetAnimStart(50), app.TimelineSetAnimEnd(550)
+    code, message = app.refusal(operation, frame)
+    assert code == m.ApplicationError and message.startswith("the ranges must keep animation start <= play start")
+    ranges = [app.TimelineGetAnimStart(), app.TimelineGetPlayStart(), app.TimelineGetPlayEnd(), app.TimelineGetAnimEnd()]
+    assert ranges == [50, 150, 250, 550]
+
+
+@pytest.mark.parametrize("operation, args", [("TimelineSetFrames", (0,)), ("TimelineSetFrames", (601,)),
+                                             ("TimelineSetPlayEnd", (601,)), ("TimelineSelectRange", (1, 601, 0))])
+def test_frames_outside_the_take_are_refused(app, operation, args):
+    assert app.refusal(operation, *args)[0] == m.InvalidFrameNumber
+    assert app.TimelineGetFrames() == 1 and app.TimelineGetPlayEnd() == 600 and app.TimelineGetSelectedRanges() == []
+
+
+def test_time_code_standards(app):
+    assert app.TimelineGetTimeCodeStandard() == "PAL"
+    for standard in ("Film", "PAL", "NTSC", "NTSCDrop", "HD50", "HD60"):
+        app.TimelineSetTimeCodeStandard(standard)
+        assert app.TimelineGetTimeCodeStandard() == standard
+    assert app.refusal("TimelineSetTimeCodeStandard", "SECAM") == (
+        m.ApplicationError, "'SECAM' is not a time-code standard (Film, PAL, NTSC, NTSCDrop, HD50, HD60)")
+
+
+def test_play_advances_in_real_time_until_stop(app):
+    app.TimelineSetPlayStart(10)
+    app.TimelinePlay()
+    started = time.monotonic()
+    time.sleep(0.3)
+    app.TimelineStop()
+    elapsed = time.monotonic() - started
+    stopped = app.TimelineGetFrames()
+    assert 10 + 20 <= stopped <= 10 + elapsed * 100 + 2
+    time.sleep(0.1)
+    assert app.TimelineGetFrames() == stopped
+
+
+@pytest.mark.parametrize("steps, ranges", [
+    ([(10, 20, 0), (30, 40, 1)], [10, 20, 30, 40]),
+    ([(10, 20, 0), (30, 40, 0)], [30, 40]),
+    ([(10, 40, 0), (20, 30, 2)], [10, 19, 31, 40]),
+    ([(10, 30, 0), (20, 40, 3)], [10, 19, 31, 40]),
+])
+def test_selected_ranges(app, steps, ranges):
+    for step in steps:
+        app.TimelineSelectRange(*step)
+    assert app.TimelineGetSelectedRanges() == ranges
+    app.TimelineInvertSelection()
+    app.TimelineInvertSelection()
+    assert app.TimelineGetSelectedRanges() == ranges
+
+
+def test_select_all_and_invert(app):
+    app.TimelineSelectAll(0)
+    assert app.TimelineGetSelectedRanges() == [1, 600]
+    app.TimelineSelectRange(2, 599, 2)
+    app.TimelineInvertSelection()
+    assert app.TimelineGetSelectedRanges() == [2, 599]
+    assert app.refusal("TimelineSelectRange", 9, 3, 0) == (
+        m.ApplicationError, "a range runs from its first frame to its last: 9 is after 3")
