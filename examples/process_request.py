@@ -1,0 +1,42 @@
+"""Runs commands by name: describes one, runs it with ProcessRequest, and runs another as a PSL line.
+
+    python examples/process_request.py                   # starts its own application
+    python examples/process_request.py HOST PORT         # uses a running one
+"""
+from __future__ import annotations
+
+import sys
+
+import Client3
+from Client3.testing import running_host
+
+
+def by_name(client: Client3.ZarvoPelluxPostClient) -> None:
+    print(f"{len(client.GetCommandList().check().Commands)} commands")
+
+    # A command's description, its inputs with their defaults and its outputs.
+    info = client.GetCommandInfo("GetServerInfo").check()
+    print(info.DefaultOutputString())
+
+    # Run it by name with the described inputs; the outputs come back as name and text pairs,
+    # shown here through the description, whose outputs they replace.
+    reply = client.ProcessRequest("GetServerInfo", info.InputParameters).check()
+    info.OutputParameters = reply.OutputParameters
+    print(info.DefaultOutputString())
+
+    # A command with arguments, written as one line.
+    line = client.PSL('GetSubjectParamDetails Subject=Alice Skeleton="" Parameter=Height').check()
+    print(str(line.Str), end="")
+
+
+def main(argv: list[str]) -> None:
+    if len(argv) == 3:
+        with Client3.connect(argv[1], int(argv[2])) as client:
+            by_name(client)
+        return
+    with running_host(log=False) as host, Client3.connect(host.address, host.port) as client:
+        by_name(client)
+
+
+if __name__ == "__main__":
+    main(sys.argv)
