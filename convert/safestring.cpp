@@ -5,6 +5,7 @@
 
 #include "convert/scalar.h"
 #include "convert/text.h"
+#include "library/ResultText.h"
 #include "runtime/module.h"
 #include "runtime/wrap.h"
 
@@ -115,24 +116,10 @@ PyObject* NewSafeString(PyObject*, PyObject* args) {
   return nullptr;
 }
 
-const char* ResultMessage(ZarvoSDKClientCPP::ResultCode::Enum code) {
-  switch (code) {
-    case 0: return "OK";
-    case 1000: return "Unable to communicate with the host application.";
-    case 1001: return "Host application failed to respond to the information request.";
-    case 1002: return "Unable to interpret information sent from the host application.";
-    case 1003: return "Host application encountered an error processing the request.";
-    case 1004: return "Frame number specified is invalid.";
-    case 1005: return "Unable to convert output parameter to a numeric value.";
-    case 1006: return "Invalid number of frames returned, expected one frame.";
-    default: return "Unknown Error";
-  }
-}
-
 constexpr auto IsEmpty = [](const SafeString* s) { return !s->Text() || !*s->Text(); };
 constexpr auto Value = [](const SafeString* s) { return SafeStringText(*s); };
 constexpr auto Message = [](ZarvoSDKClientCPP::ResultCode::Enum code) {
-  const char* message = ResultMessage(code);
+  const char* message = ZarvoSDKClientCPP::ResultText(code);
   return TextToPython(message, std::strlen(message));
 };
 

@@ -7,14 +7,13 @@
 #include <string>
 #include <vector>
 
+#include "library/ResultText.h"
 #include "platform/net.h"
 #include "protocol/wire.h"
 #include "ZarvoSDKClientCPP/ZarvoPelluxPostClient.h"
 
 namespace ZarvoSDKClientCPP {
 
-// The message of a result code.
-char const* ResultText(int code);
 
 // How long Connect waits for the application, and how long a request waits for its reply, unless
 // the address says otherwise ("host?timeout=MS&connect=MS").
