@@ -90,7 +90,11 @@ constexpr Type ElementType(Type type) {
 // Builds one frame: the header is reserved first and filled in by Finish.
 class Writer {
 public:
-  Writer() { bytes_.resize(kHeaderSize); }
+  // Room for a small frame from the start: most requests and replies need no other allocation.
+  Writer() {
+    bytes_.reserve(256);
+    bytes_.resize(kHeaderSize);
+  }
   explicit Writer(Kind kind) : Writer() { Raw(kind); }
 
   void Clear(Kind kind) {
@@ -104,8 +108,10 @@ public:
     Append(&value, sizeof value);
   }
   void Append(const void* data, std::size_t size) {
-    const auto* p = static_cast<const char*>(data);
-    bytes_.insert(bytes_.end(), p, p + size);
+    if (size == 0) return;
+    std::size_t at = bytes_.size();
+    bytes_.resize(at + size);
+    std::memcpy(bytes_.data() + at, data, size);
   }
   void RawText(std::string_view text) {
     Raw(static_cast<std::uint32_t>(text.size()));
