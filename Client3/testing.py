@@ -63,6 +63,18 @@ def running_host(
             process.stdout.close()
 
 
+@contextmanager
+def connected(argv: Sequence[str] = ()) -> Iterator[Any]:
+    """A client connected to the application at `argv`'s HOST and PORT when a script was given
+    them, or else to an application of its own, started for the block and stopped after it."""
+    if len(argv) >= 2:
+        with Client3.connect(argv[0], int(argv[1])) as client:
+            yield client
+        return
+    with running_host(log=False) as host, Client3.connect(host.address, host.port) as client:
+        yield client
+
+
 try:
     import pytest
 except ImportError:  # pytest is needed only for the fixtures

@@ -12,7 +12,7 @@ import numpy as np
 import numpy.typing as npt
 
 import Client3
-from Client3.testing import running_host
+from Client3.testing import connected
 
 Trajectory = Tuple[npt.NDArray[np.float64], npt.NDArray[np.bool_]]
 
@@ -37,11 +37,7 @@ def report(client: Client3.ZarvoPelluxPostClient) -> None:
 
 
 def main(argv: list[str]) -> None:
-    if len(argv) == 3:
-        with Client3.connect(argv[1], int(argv[2])) as client:
-            report(client)
-        return
-    with running_host(log=False) as host, Client3.connect(host.address, host.port) as client:
+    with connected(argv[1:]) as client:
         report(client)
 
 

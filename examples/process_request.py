@@ -8,7 +8,7 @@ from __future__ import annotations
 import sys
 
 import Client3
-from Client3.testing import running_host
+from Client3.testing import connected
 
 
 def by_name(client: Client3.ZarvoPelluxPostClient) -> None:
@@ -30,11 +30,7 @@ def by_name(client: Client3.ZarvoPelluxPostClient) -> None:
 
 
 def main(argv: list[str]) -> None:
-    if len(argv) == 3:
-        with Client3.connect(argv[1], int(argv[2])) as client:
-            by_name(client)
-        return
-    with running_host(log=False) as host, Client3.connect(host.address, host.port) as client:
+    with connected(argv[1:]) as client:
         by_name(client)
 
 

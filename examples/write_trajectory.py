@@ -9,7 +9,7 @@ import sys
 from typing import List, Tuple
 
 import Client3
-from Client3.testing import running_host
+from Client3.testing import connected
 
 SUBJECT, MARKER = "Alice", "RWRA"
 
@@ -36,12 +36,8 @@ def fill_gaps(client: Client3.ZarvoPelluxPostClient) -> Tuple[int, int]:
 
 
 def main(argv: list[str]) -> None:
-    if len(argv) == 3:
-        with Client3.connect(argv[1], int(argv[2])) as client:
-            before, after = fill_gaps(client)
-    else:
-        with running_host(log=False) as host, Client3.connect(host.address, host.port) as client:
-            before, after = fill_gaps(client)
+    with connected(argv[1:]) as client:
+        before, after = fill_gaps(client)
     print(f"{SUBJECT}'s {MARKER}: {before} frames unseen before, {after} after")
 
 
