@@ -14,14 +14,25 @@ to the table therefore shows up here without a change to this file.
 Operations answer with records; a failure inside the application is reported in the record's
 `Result` and `ResultString`, never raised. `record.ok` tells success, and `record.check()` raises
 `Client3.Error` for scripts that prefer exceptions.
+
+The numeric vectors are buffers for NumPy without a copy (`numpy.asarray(v)`, `v.view()`,
+`vectord.from_buffer(array)`, `record.arrays()` of a trajectory), through the package's second
+extension module `Client3._buffers`. While a view of a vector is exported, operations that could
+move its storage raise BufferError. NumPy itself is imported only when an array is asked for.
 """
 from __future__ import annotations
 
 import collections.abc
 import itertools
+import pkgutil
 from typing import Any, Callable, Dict, Iterator, List, NamedTuple, Optional, Tuple
 
 import _Client3
+
+# The package's own extension modules are installed beside this file; with a source tree first on the
+# path, the installed ones are found all the same.
+__path__ = pkgutil.extend_path(__path__, __name__)
+from Client3 import _buffers  # noqa: E402
 
 _REGISTER, _INIT, _NEW, _DELETE = "_swigregister", "_swiginit", "new_", "delete_"
 
@@ -177,6 +188,16 @@ class _Client(_Proxy):
 
 _REPR_LIMIT = 30
 
+# The vectors whose elements lie side by side in memory, with the format of their views.
+VIEWABLE = {"vectord": "d", "vectorf": "f", "vectori": "i", "vectorull": "Q"}
+
+# Operations of the module's vectors that may move their storage: refused while a view of the
+# vector is exported (swap checks both vectors). Slice assignment is checked in __setitem__.
+_RESIZING = frozenset(
+    {"append", "push_back", "pop", "pop_back", "resize", "reserve", "clear", "erase", "assign", "swap",
+     "__setslice__", "__delslice__", "__delitem__"}
+)
+
 
 class _Vector(_Proxy, collections.abc.MutableSequence):  # type: ignore[type-arg]
     """The vectors as mutable sequences. Indexing, slices, len, append and clear are the module's
@@ -199,6 +220,7 @@ class _Vector(_Proxy, collections.abc.MutableSequence):  # type: ignore[type-arg
         self[len(self) :] = list(values)
 
     def pop(self, index: int = -1) -> Any:
+        _buffers.guard(self)
         if index == -1:
             return _functions[self._name + "_pop"](self)
         self[index]  # IndexError when there is no such element
@@ -220,6 +242,42 @@ class _Vector(_Proxy, collections.abc.MutableSequence):  # type: ignore[type-arg
         return equal if equal is NotImplemented else not equal
 
     __hash__ = None  # type: ignore[assignment]
+
+    def view(self) -> memoryview:
+        """A read-write memoryview over the elements, without a copy (vectord, vectorf, vectori and
+        vectorull; formats d, f, i, Q). It keeps this vector, and the record it belongs to, alive."""
+        return _buffers.view(self)  # type: ignore[no-any-return]
+
+    def fill(self, buffer: Any) -> None:
+        """Replaces the contents from a C-contiguous buffer of matching numbers in one copy; see
+        Client3._buffers.fill for the rules. Unchanged on failure."""
+        _buffers.fill(self, buffer)
+
+    @classmethod
+    def from_buffer(cls, buffer: Any) -> Any:
+        """A new vector holding the elements of a buffer (a NumPy array, array.array, bytes)."""
+        vector = cls()
+        _buffers.fill(vector, buffer)
+        return vector
+
+    def __array__(self, dtype: Any = None, copy: Optional[bool] = None) -> Any:
+        """numpy.asarray(v): the vector's own storage for the numeric vectors, a copy for vectorb
+        (its bits are packed) and vectorss (texts)."""
+        import numpy
+
+        if self._name in VIEWABLE:
+            array = numpy.asarray(_buffers.view(self))
+        elif copy is False:
+            raise ValueError(f"a {self._name} has no contiguous storage: it becomes an array only as a copy")
+        else:
+            values = _buffers.copy(self)
+            array = numpy.asarray(values, dtype=str) if isinstance(values, list) else numpy.asarray(values)
+            copy = False
+        if dtype is not None and array.dtype != numpy.dtype(dtype):
+            if copy is False:
+                raise ValueError(f"a {self._name} becomes an array of {dtype} only as a copy")
+            return array.astype(dtype)
+        return array.copy() if copy else array
 
     def __repr__(self) -> str:
         shown = [_show(value) for value in itertools.islice(self, _REPR_LIMIT)]
@@ -262,6 +320,46 @@ def _method(function: Callable[..., Any], name: str) -> Callable[..., Any]:
     return method
 
 
+def _resizing(function: Callable[..., Any], name: str) -> Callable[..., Any]:
+    guard = _buffers.guard
+    if name == "swap":
+
+        def method(self: Any, *args: Any) -> Any:
+            guard(self, *args)
+            return function(self, *args)
+
+    elif name == "__setitem__":
+
+        def method(self: Any, *args: Any) -> Any:
+            # A slice given a sequence of its own length is written in place; anything else may move.
+            if args and isinstance(args[0], slice) and _buffers.exporting():
+                value = args[1] if len(args) > 1 else ()
+                if not hasattr(value, "__len__") or len(value) != len(range(*args[0].indices(len(self)))):
+                    guard(self)
+            return function(self, *args)
+
+    else:
+
+        def method(self: Any, *args: Any) -> Any:
+            guard(self)
+            return function(self, *args)
+
+    method.__name__ = name
+    return method
+
+
+def _trajectory_arrays(self: Any) -> Tuple[Any, Any, Any, Any]:
+    """The four fields as NumPy arrays in one call: X, Y and Z are float64 arrays over the record's
+    own storage (no copy; they keep the record alive), E a bool array (a copy: its bits are packed)."""
+    import numpy
+
+    return numpy.asarray(self.X), numpy.asarray(self.Y), numpy.asarray(self.Z), numpy.asarray(self.E)
+
+
+# Members of single classes that the function table does not give.
+_EXTRAS: Dict[str, Dict[str, Any]] = {"Output_GetTrajectory": {"arrays": _trajectory_arrays}}
+
+
 class ParameterVector:
     """A record's parameter list. It has no operations of its own: it is passed back to
     ProcessRequest, which reads it through `this`; it keeps its record alive while it is held."""
@@ -272,6 +370,8 @@ class ParameterVector:
 
 
 def _field(getter: Callable[..., Any], setter: Callable[..., Any], name: str) -> property:
+    exporting = _buffers.exporting
+
     def get(self: Any) -> Any:
         value = getter(self)
         # A text or vector field points into the record: keep the record while it is in use.
@@ -283,6 +383,9 @@ def _field(getter: Callable[..., Any], setter: Callable[..., Any], name: str) ->
         return value
 
     def put(self: Any, value: Any) -> None:
+        # Assigning a vector field may move its storage: refused while a view of it is exported.
+        if exporting():
+            _buffers.guard(getter(self))
         setter(self, value)
 
     return property(get, put, doc=f"The record's {name} field.")
@@ -295,7 +398,9 @@ def _make(name: str, members: Members, classes: Dict[str, type]) -> type:
     namespace: Dict[str, Any] = {"_name": name, "__module__": __name__}
     for method in members.methods:
         if method not in vars(kind):
-            namespace[method] = _method(_functions[f"{name}_{method}"], method)
+            wrap = _resizing if name in VECTORS and (method in _RESIZING or method == "__setitem__") else _method
+            namespace[method] = wrap(_functions[f"{name}_{method}"], method)
+    namespace.update(_EXTRAS.get(name, {}))
     for field in members.fields:
         namespace[field] = _field(_functions[f"{name}_{field}_get"], _functions[f"{name}_{field}_set"], field)
     inherited = getattr(bases[0], "_fields", ())

@@ -2,7 +2,7 @@
 library's declared interface, so that the stubs name exactly the classes, methods and properties
 that Client3 builds at import.
 
-    python -m Client3._generate            # rewrite the stubs
+    python -m Client3._generate            # rewrite the stubs (and those of Client3._buffers)
     python -m Client3._generate --check    # exit 1 when the stubs on disk differ
 
 Run from the repository: the argument and field types are read from include/ and the argument
@@ -20,6 +20,7 @@ import Client3
 PACKAGE = Path(__file__).resolve().parent
 ROOT = PACKAGE.parent
 STUBS = PACKAGE / "__init__.pyi"
+BUFFER_STUBS = PACKAGE / "_buffers.pyi"
 HEADERS = ROOT / "include" / "ZarvoSDKClientCPP"
 CATALOGUE = ROOT / "protocol" / "catalogue.h"
 
@@ -110,6 +111,11 @@ VECTOR = '''class {name}(MutableSequence[{element}]):
     def pop(self, index: int = ...) -> {element}: ...
     def append(self, value: {element}) -> None: ...
     def clear(self) -> None: ...
+    def view(self) -> memoryview: ...
+    def fill(self, buffer: Any) -> None: ...
+    @classmethod
+    def from_buffer(cls, buffer: Any) -> {name}: ...
+    def __array__(self, dtype: Any = ..., copy: Optional[bool] = ...) -> Any: ...
 '''
 VECTOR_TYPED = {"__getitem__", "__setitem__", "__delitem__", "__len__", "insert", "extend", "pop", "append", "clear"}
 
@@ -142,6 +148,7 @@ class Members(NamedTuple):
 
 TABLE: Dict[str, Members]
 VECTORS: Tuple[str, ...]
+VIEWABLE: Dict[str, str]
 RECORD_BASE: str
 classes: Dict[str, type]
 def base_of(name: str) -> Optional[str]: ...
@@ -192,6 +199,8 @@ def generate() -> str:
                 kind = python_type(declared[name][field], False)
                 out.append(f"    @property\n    def {field}(self) -> {kind}: ...\n    @{field}.setter\n    def {field}(self, value: {kind}) -> None: ...\n")
             out += [method(m, [], python_type(declared[name][m], False)) for m in members.methods]
+        if name == "Output_GetTrajectory":
+            out.append("    def arrays(self) -> Tuple[Any, Any, Any, Any]: ...\n")
         if name == Client3.RECORD_BASE:
             out.append("    @property\n    def ok(self) -> bool: ...\n    def check(self: _R) -> _R: ...\n")
         out.append("\n")
@@ -199,14 +208,37 @@ def generate() -> str:
     return "".join(out)
 
 
+# The functions of Client3._buffers; generate_buffers() fails when the module has others.
+BUFFERS = {
+    "view": "def view(v: Any) -> memoryview: ...",
+    "copy": "def copy(v: Any) -> Union[memoryview, List[str]]: ...",
+    "fill": "def fill(v: Any, buffer: Any) -> None: ...",
+    "exports": "def exports(v: Any) -> int: ...",
+    "guard": "def guard(*vectors: Any) -> None: ...",
+    "exporting": "def exporting() -> bool: ...",
+}
+
+
+def generate_buffers() -> str:
+    from Client3 import _buffers
+
+    functions = sorted(name for name, value in vars(_buffers).items() if callable(value) and not name.startswith("_"))
+    if functions != sorted(BUFFERS):
+        raise SystemExit(f"Client3._buffers has the functions {functions}: describe them in BUFFERS")
+    lines = [HEAD.splitlines()[0], "from typing import Any, List, Union", ""] + [BUFFERS[name] for name in functions]
+    return "\n".join(lines) + "\n"
+
+
 def main(argv: List[str]) -> int:
-    text = generate()
+    written = {STUBS: generate(), BUFFER_STUBS: generate_buffers()}
     if "--check" in argv:
-        if STUBS.read_text() != text:
-            print(f"{STUBS} differs from the module's function table: run python -m Client3._generate", file=sys.stderr)
-            return 1
+        for path, text in written.items():
+            if not path.exists() or path.read_text() != text:
+                print(f"{path} differs from the module's function table: run python -m Client3._generate", file=sys.stderr)
+                return 1
         return 0
-    STUBS.write_text(text)
+    for path, text in written.items():
+        path.write_text(text)
     return 0
 
 
