@@ -342,11 +342,10 @@ Trajectory TrajectoryOf(Scene& scene, Reader& in) {
 template <>
 void Handle<Id::GetTrajectory>(Context& context, Reader& in, Writer& out) {
   Trajectory t = TrajectoryOf(context.scene, in);
-  auto frames = static_cast<std::size_t>(context.scene.frames);
-  std::vector<double> x(frames), y(frames), z(frames);
-  std::vector<bool> e(frames);
-  for (std::size_t f = 0; f < frames; ++f) x[f] = t.At(t.x, f), y[f] = t.At(t.y, f), z[f] = t.At(t.z, f), e[f] = t.Seen(f);
-  out.Put(x), out.Put(y), out.Put(z), out.Put(e);
+  // The channels' values are the positions, written as they are stored.
+  out.Put(t.x.values), out.Put(t.y.values), out.Put(t.z.values);
+  char* seen = out.Block(protocol::Type::Bools, t.x.values.size(), 1);
+  for (std::size_t f = 0; f < t.x.values.size(); ++f) seen[f] = t.Seen(f);
 }
 
 void SetFrame(Trajectory& t, std::size_t f, double x, double y, double z, bool seen) {

@@ -136,11 +136,16 @@ public:
     Append(values.data(), values.size() * sizeof(T));
   }
   void Put(const std::vector<bool>& values) {
-    Tag(Type::Bools);
-    Raw(static_cast<std::uint32_t>(values.size()));
+    char* out = Block(Type::Bools, values.size(), 1);
+    for (bool v : values) *out++ = v;
+  }
+  // An array of `count` elements of `size` bytes each, left for the caller to fill in place.
+  char* Block(Type type, std::size_t count, std::size_t size) {
+    Tag(type);
+    Raw(static_cast<std::uint32_t>(count));
     std::size_t at = bytes_.size();
-    bytes_.resize(at + values.size());
-    for (bool v : values) bytes_[at++] = v;
+    bytes_.resize(at + count * size);
+    return bytes_.data() + at;
   }
   // Any list of texts: each element gives its text through `text(element)`.
   template <class List, class Get>
