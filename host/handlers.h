@@ -19,6 +19,8 @@ std::span<const HandlerEntry> SceneHandlers();     // connection, protocol, subj
 std::span<const HandlerEntry> ObjectHandlers();    // objects, attributes, channels, parameters (objects.cpp)
 std::span<const HandlerEntry> FileHandlers();      // scenes, files, scripts, database (files.cpp)
 std::span<const HandlerEntry> TimelineHandlers();  // timeline (timeline.cpp)
+std::span<const HandlerEntry> SettingsHandlers();  // the processing settings (settings.cpp)
+std::span<const HandlerEntry> FilterHandlers();    // the channel filters (filters.cpp)
 
 // Lookups shared by the groups, refusing with a message that names what is missing.
 Object& ObjectOf(Scene& scene, ObjectId id);

@@ -18,6 +18,8 @@
 #include <unordered_map>
 #include <vector>
 
+#include "host/settings.h"
+
 namespace client3::host {
 
 using ObjectId = std::uint64_t;
@@ -129,6 +131,7 @@ struct Scene {
   std::vector<ObjectId> selection;  // in the order the objects were selected
   ObjectId activeClip = 0;
   Timeline timeline;
+  Settings settings;  // the processing stages' settings, kept with the scene
 
   explicit Scene(int frames = 1, std::string name = "Untitled");
 

@@ -4,6 +4,8 @@
 //   frames 1000
 //   timeline RATE TICKS PLAY_START PLAY_END ANIM_START ANIM_END STANDARD
 //   ranges FIRST-LAST,...            (selected frame ranges; "-" for none)
+//   settings RECORD VALUE...         (one line per settings record, values in field order;
+//                                     a record without a line keeps its defaults)
 //   object INDEX PARENT TYPE NAME    (the root is object 0 with parent "-"; parents come first)
 //   attribute NAME VALUE             (of the object above)
 //   parameter NAME KIND VALUE DEFAULT UNIT REQUIRED
@@ -89,6 +91,11 @@ std::string WriteScene(Scene& scene) {
   out += "timeline " + std::to_string(t.rate) + " " + std::to_string(t.Now()) + " " + std::to_string(t.playStart) + " " +
          std::to_string(t.playEnd) + " " + std::to_string(t.animStart) + " " + std::to_string(t.animEnd) + " " + Encode(t.standard) + "\n";
   out.append("ranges ").append(Ranges(t.selected)).append(1, '\n');
+  for (std::size_t r = 0; r < kRecordCount; ++r) {
+    out.append("settings ").append(RecordName(static_cast<Record>(r)));
+    for (const std::string& value : scene.settings.values[r]) out.append(1, ' ').append(Encode(value));
+    out += "\n";
+  }
   std::map<ObjectId, std::size_t> index;
   std::vector<ObjectId> order{scene.root};
   for (ObjectId id : scene.Descendants(scene.root)) order.push_back(id);
@@ -183,8 +190,17 @@ Scene ReadScene(std::string_view text) {
       from = comma + 1;
     }
   }
+  Settings settings;
+  while (at < lines.size() && lines[at][0] == "settings") {
+    auto& words = lines[at++];
+    if (words.size() < 2) Bad(at, "'settings' without a record");
+    std::vector<std::string> values;
+    for (std::size_t i = 2; i < words.size(); ++i) values.push_back(Decode(words[i], at));
+    if (std::string why = SetRecordFromText(settings, words[1], values); !why.empty()) Bad(at, why);
+  }
   Scene scene(frames);
   scene.timeline = t;
+  scene.settings = settings;
   std::vector<ObjectId> ids;
   while (at < lines.size() && lines[at][0] == "object") {
     auto& o = next("object", 4, 4);

@@ -1,0 +1,155 @@
+"""The two channel filters against real hosts, checked against the same kernels applied with
+NumPy/SciPy: gaps stay gaps and never reach their neighbours, and bad constants change nothing."""
+import numpy as np
+import pytest
+from scipy import signal
+
+from appclient import Client
+
+FRAMES = 300
+MARKER = ("Alice", "RANK")  # a marker with a gap in the demo take
+
+
+@pytest.fixture
+def app(start_host):
+    client = Client(start_host("--frames", str(FRAMES)))
+    yield client
+    client.close()
+
+
+def marker(app):
+    obj = app.SceneGetObject("/" + "/".join(MARKER))[0]
+    return obj, {axis: int(app.ObjectGetChannel(obj, axis)[2]) for axis in "XYZ"}
+
+
+def trajectory(app):
+    x, y, z, seen = app.GetTrajectory(*MARKER)
+    return np.array([x, y, z]), np.array(seen)
+
+
+def runs(mask):
+    """(first, end) of every stretch of True."""
+    edges = np.flatnonzero(np.diff(np.concatenate([[0], mask.astype(int), [0]])))
+    return list(zip(edges[::2], edges[1::2]))
+
+
+def filtered(values, mask, kernel):
+    """The kernel applied to each stretch of `mask` on its own, each extended by its odd reflection."""
+    out = values.copy()
+    half = len(kernel) // 2
+    for first, end in runs(mask):
+        part = values[first:end]
+        if len(part) <= half:
+            continue
+        left = 2 * part[0] - part[1:half + 1][::-1]
+        right = 2 * part[-1] - part[-half - 1:-1][::-1]
+        out[first:end] = signal.convolve(np.concatenate([left, part, right]), kernel, mode="valid", method="direct")
+    return out
+
+
+def fir(taps, cutoff, rate, transition):
+    return signal.firwin(taps, cutoff + transition / 2, window="hamming", fs=rate)
+
+
+def scene_bytes(app, path):
+    app.SaveFile(str(path), "")
+    return path.read_bytes()
+
+
+@pytest.mark.parametrize("taps, cutoff, rate, transition", [
+    (1, 10, 100, 0), (5, 6, 100, 0), (21, 6, 100, 4), (31, 1.5, 0, 2), (61, 20, 250, 10), (299, 8, 100, 1),
+])
+def test_fir_matches_the_same_coefficients_applied_with_scipy(app, taps, cutoff, rate, transition):
+    obj, channels = marker(app)
+    before, seen = trajectory(app)
+    app.FilterApplyFIR(obj, channels["X"], "XYZ", False, taps, cutoff, rate, transition)
+    after, still_seen = trajectory(app)
+    kernel = fir(taps, cutoff, rate or 100, transition)
+    for axis in range(3):
+        np.testing.assert_allclose(after[axis], filtered(before[axis], seen, kernel), rtol=1e-9, atol=1e-9)
+    assert (still_seen == seen).all()
+    assert (after[:, ~seen] == before[:, ~seen]).all()
+
+
+@pytest.mark.parametrize("window, weights", [(1, [1]), (3, [1, 1, 1]), (9, np.ones(9)), (5, signal.windows.triang(5)),
+                                             (15, signal.windows.triang(15))])
+def test_weighted_average_matches_the_same_weights_applied_with_scipy(app, window, weights):
+    obj, channels = marker(app)
+    before, seen = trajectory(app)
+    weighting = 0 if np.all(np.asarray(weights) == weights[0]) else 1
+    app.FilterApplyWeightedAverage(obj, channels["Z"], "XYZ", False, window, weighting)
+    after, _ = trajectory(app)
+    kernel = np.asarray(weights, dtype=float) / np.sum(weights)
+    for axis in range(3):
+        np.testing.assert_allclose(after[axis], filtered(before[axis], seen, kernel), rtol=1e-9, atol=1e-9)
+
+
+def test_the_gap_does_not_reach_its_neighbours(app):
+    obj, channels = marker(app)
+    before, seen = trajectory(app)
+    gap = np.flatnonzero(~seen)
+    assert len(gap) > 0
+    app.FilterApplyFIR(obj, channels["Y"], "", False, 41, 3, 100, 0)
+    after, _ = trajectory(app)
+    # The frames just before and after the gap are filtered from their own side only: their
+    # reflection stands in for the gap, whose stored zeros would pull them far down.
+    edge = [gap[0] - 1, gap[-1] + 1]
+    assert np.abs(after[1, edge] - before[1, edge]).max() < 5
+    assert (after[1, gap] == 0).all()
+
+
+def test_an_empty_component_filters_only_the_named_channel(app):
+    obj, channels = marker(app)
+    before, seen = trajectory(app)
+    app.FilterApplyWeightedAverage(obj, channels["Y"], "", False, 7, 0)
+    after, _ = trajectory(app)
+    assert (after[0] == before[0]).all() and (after[2] == before[2]).all()
+    assert not (after[1] == before[1]).all()
+
+
+def test_selected_only_uses_and_changes_the_selected_frames_alone(app):
+    obj, channels = marker(app)
+    before, seen = trajectory(app)
+    app.TimelineSelectRange(50, 100, 0)
+    app.FilterApplyFIR(obj, channels["X"], "", True, 11, 5, 100, 0)
+    after, _ = trajectory(app)
+    selected = np.zeros(FRAMES, dtype=bool)
+    selected[49:100] = True
+    np.testing.assert_allclose(after[0], filtered(before[0], seen & selected, fir(11, 5, 100, 0)), rtol=1e-9)
+    assert (after[0, ~selected] == before[0, ~selected]).all()
+
+
+REFUSED = [
+    ("FilterApplyFIR", ("", False, 0, 5, 100, 0), "the number of taps must be an odd number from 1 to the take's 300 frames, not 0"),
+    ("FilterApplyFIR", ("", False, 4, 5, 100, 0), "not 4"),
+    ("FilterApplyFIR", ("", False, 301, 5, 100, 0), "not 301"),
+    ("FilterApplyFIR", ("", False, 5, 50, 100, 0), "below the Nyquist frequency, 50 Hz"),
+    ("FilterApplyFIR", ("", False, 5, 45, 100, 10), "below the Nyquist frequency, 50 Hz"),
+    ("FilterApplyFIR", ("", False, 5, 0, 100, 0), "must be above 0"),
+    ("FilterApplyFIR", ("", False, 5, 5, -100, 0), "the sample rate must be above 0 Hz"),
+    ("FilterApplyFIR", ("", False, 5, 5, 100, -1), "the transition band must be 0 Hz or wider"),
+    ("FilterApplyFIR", ("XY", False, 5, 5, 100, 0), "component 'XY' is not"),
+    ("FilterApplyFIR", ("", True, 5, 5, 100, 0), "no frame is selected"),
+    ("FilterApplyWeightedAverage", ("", False, 0, 0), "the window must be an odd number from 1 to the take's 300 frames, not 0"),
+    ("FilterApplyWeightedAverage", ("", False, 6, 0), "not 6"),
+    ("FilterApplyWeightedAverage", ("", False, 301, 0), "not 301"),
+    ("FilterApplyWeightedAverage", ("", False, 5, 2), "weighting 2 is not 0 (uniform) or 1 (triangular)"),
+]
+
+
+@pytest.mark.parametrize("operation, args, message", REFUSED)
+def test_bad_constants_are_refused_and_change_nothing(app, tmp_path, operation, args, message):
+    obj, channels = marker(app)
+    before = scene_bytes(app, tmp_path / "before.scene")
+    code, text = app.refusal(operation, obj, channels["X"], *args)
+    assert message in text
+    assert scene_bytes(app, tmp_path / "after.scene") == before
+
+
+@pytest.mark.parametrize("operation, constants", [("FilterApplyFIR", (5, 5, 100, 0)), ("FilterApplyWeightedAverage", (5, 0))])
+def test_a_missing_object_or_channel_is_refused(app, operation, constants):
+    obj, channels = marker(app)
+    assert "no object with id" in app.refusal(operation, 10**12, channels["X"], "", False, *constants)[1]
+    assert "has no channel with id" in app.refusal(operation, obj, 10**12, "", False, *constants)[1]
+    root = app.SceneGetObject("/")[0]
+    assert "no object" not in app.refusal(operation, root, channels["X"], "", False, *constants)[1]
