@@ -9,6 +9,8 @@
 #include <winsock2.h>
 #include <ws2tcpip.h>
 #include <windows.h>
+// <windows.h> names its own ReplaceFile as a macro for ReplaceFileA/W; ours keeps its name.
+#undef ReplaceFile
 #else
 #include <arpa/inet.h>
 #include <csignal>
