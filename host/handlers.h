@@ -21,6 +21,7 @@ std::span<const HandlerEntry> FileHandlers();      // scenes, files, scripts, da
 std::span<const HandlerEntry> TimelineHandlers();  // timeline (timeline.cpp)
 std::span<const HandlerEntry> SettingsHandlers();  // the processing settings (settings.cpp)
 std::span<const HandlerEntry> FilterHandlers();    // the channel filters (filters.cpp)
+std::span<const HandlerEntry> ProcessingHandlers(); // the processing stages (processing.cpp)
 
 // Lookups shared by the groups, refusing with a message that names what is missing.
 Object& ObjectOf(Scene& scene, ObjectId id);
