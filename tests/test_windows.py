@@ -1,6 +1,6 @@
 """The application built for 64-bit Windows with mingw-w64, run under Wine and driven by this system's
 client: connecting, the command protocol, the scene, subject and trajectory operations, trajectories
-written and read back, the result codes, a client that vanishes and a clean stop. Every query is
+written and read back, scene files, the result codes, a client that vanishes and a clean stop. Every query is
 answered as the application built for this system answers it.
 
 The library and the application are built once per session into build/windows of the source tree;
@@ -263,6 +263,26 @@ def test_scene_renamed(start_host, clients):
     assert call(client, "SetSceneName", "Überlauf 1") is True
     assert reply(call(client, "GetSceneName"))["Name"] == "Überlauf 1"
     assert call(client, "SetSceneName", "") is False
+
+
+def test_scene_file_saved_over_and_loaded(start_host, clients, tmp_path):
+    client = clients(start_host("--frames", "10"))
+    folder = tmp_path / "Szenen ü"
+    folder.mkdir()
+    path = "Z:" + str(folder / "walk.scene").replace("/", "\\")  # Wine's drive Z: is the root of this system
+    assert result(call(client, "SaveFile", path, "")) == (m.Success, "OK")
+    first = (folder / "walk.scene").read_text(encoding="utf-8")
+    assert first.startswith("client3-scene 1\nframes 10\n")
+
+    # Saving again replaces the file in one step.
+    assert call(client, "SetSceneName", "Second") is True
+    assert result(call(client, "SaveFile", path, "")) == (m.Success, "OK")
+    assert [p.name for p in folder.iterdir()] == ["walk.scene"]
+    assert (folder / "walk.scene").read_text(encoding="utf-8") != first
+
+    assert result(call(client, "NewScene")) == (m.Success, "OK")
+    assert result(call(client, "LoadFile", path)) == (m.Success, "OK")
+    assert reply(call(client, "GetSceneName")) == dict(Name="Second", Path=path, code=m.Success, message="OK")
 
 
 # ---- Result codes that the client makes of a misbehaving application ------------------------------
