@@ -405,7 +405,8 @@ constexpr HandlerEntry kSceneHandlers[] = {
 struct Dispatch {
   Handler handlers[protocol::kCommandCount] = {};
   Dispatch() {
-    for (auto group : {SceneHandlers(), ObjectHandlers(), FileHandlers(), TimelineHandlers(), SettingsHandlers(), FilterHandlers(), ProcessingHandlers()})
+    for (auto group : {SceneHandlers(), ObjectHandlers(), FileHandlers(), TimelineHandlers(), SettingsHandlers(), FilterHandlers(),
+                       ProcessingHandlers(), InterchangeHandlers(), WorkspaceHandlers()})
       for (const HandlerEntry& entry : group) {
         Handler& slot = handlers[static_cast<std::size_t>(entry.id)];
         if (slot) {

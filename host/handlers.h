@@ -17,11 +17,13 @@ struct HandlerEntry {
 
 std::span<const HandlerEntry> SceneHandlers();     // connection, protocol, subjects (commands.cpp)
 std::span<const HandlerEntry> ObjectHandlers();    // objects, attributes, channels, parameters (objects.cpp)
-std::span<const HandlerEntry> FileHandlers();      // scenes, files, scripts, database (files.cpp)
+std::span<const HandlerEntry> FileHandlers();      // scenes and scene files (files.cpp)
 std::span<const HandlerEntry> TimelineHandlers();  // timeline (timeline.cpp)
 std::span<const HandlerEntry> SettingsHandlers();  // the processing settings (settings.cpp)
 std::span<const HandlerEntry> FilterHandlers();    // the channel filters (filters.cpp)
 std::span<const HandlerEntry> ProcessingHandlers(); // the processing stages (processing.cpp)
+std::span<const HandlerEntry> InterchangeHandlers();  // importing and exporting trajectories (interchange.cpp)
+std::span<const HandlerEntry> WorkspaceHandlers();    // script paths and the capture database (workspace.cpp)
 
 // Lookups shared by the groups, refusing with a message that names what is missing.
 Object& ObjectOf(Scene& scene, ObjectId id);

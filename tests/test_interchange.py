@@ -1,0 +1,280 @@
+"""Importing and exporting trajectories against real hosts: C3D files checked with an independent
+reader and writer (the `c3d` package), CSV files with Python's csv module, both round trips, merge
+and replace, and damaged or hostile files refused with the scene left as it was."""
+import csv
+import struct
+import warnings
+
+import _Client3 as m
+import numpy as np
+import pytest
+
+from appclient import Client
+
+c3d = pytest.importorskip("c3d")
+# The independent writer warns about every file without analog channels.
+pytestmark = pytest.mark.filterwarnings("ignore:No analog data found")
+
+
+@pytest.fixture
+def app(start_host):
+    client = Client(start_host("--frames", "50"))
+    yield client
+    client.close()
+
+
+def trajectories(app):
+    """Every marker's trajectory by SUBJECT:MARKER, in the order of the tree."""
+    return {f"{s}:{mk}": app.GetTrajectory(s, mk) for s in app.GetSubjectNames()[0] for mk in app.GetMarkerNames(s)}
+
+
+def seen(trajectories):
+    """Trajectories with the positions of frames where the marker is not seen left out: files keep
+    keys only, not what a channel holds between them."""
+    return {name: tuple([v if s else None for v, s in zip(axis, e)] for axis in (x, y, z)) + (e,)
+            for name, (x, y, z, e) in trajectories.items()}
+
+
+def state(app):
+    return app.GetSceneName(), app.GetFrameCount(), app.TimelineGetFrameRate(), trajectories(app)
+
+
+def read_c3d(path):
+    """Labels, rate and the frames of a C3D file, read with every warning of the reader an error
+    (but the one that says the file has no analog channels)."""
+    with warnings.catch_warnings(), open(path, "rb") as handle:
+        warnings.simplefilter("error")
+        warnings.filterwarnings("ignore", "No analog data found")
+        reader = c3d.Reader(handle)
+        labels = [label.strip() for label in reader.point_labels]
+        frames = [(number, points.copy()) for number, points, _ in reader.read_frames()]
+        return labels, reader.point_rate, reader.first_frame, frames
+
+
+def write_c3d(path, labels, points, rate=100.0, analog=0):
+    """A C3D file made by the independent writer: points[frame][point] = (x, y, z) or None (not seen),
+    with `analog` analog channels sampled four times a frame."""
+    writer = c3d.Writer(point_rate=rate, analog_rate=rate * 4 if analog else 0)
+    for frame in points:
+        block = np.zeros((len(labels), 5), np.float32)
+        for i, p in enumerate(frame):
+            block[i] = (*p, 0, 0) if p is not None else (0, 0, 0, -1, 0)
+        writer.add_frames([(block, np.arange(analog * 4, dtype=np.float32).reshape(analog, 4 if analog else 0))])
+    writer.set_point_labels(labels)
+    if analog:
+        writer.set_analog_labels([f"Force{i}" for i in range(analog)])
+    with open(path, "wb") as handle:
+        writer.write(handle)
+
+
+def test_exported_c3d_is_read_by_an_independent_reader(app, tmp_path):
+    app.TimelineSetFrameRate(120.0)
+    path = tmp_path / "walk.c3d"
+    app.ExportFile(str(path), "")
+    labels, rate, first, frames = read_c3d(path)
+    expected = trajectories(app)
+    assert labels == list(expected) and rate == 120.0 and first == 1
+    assert [number for number, _ in frames] == list(range(1, 51))
+    for column, (x, y, z, e) in enumerate(expected.values()):
+        points = np.array([points[column] for _, points in frames])
+        assert list(points[:, 3] >= 0) == e
+        assert np.array_equal(points[:, :3], np.float32(np.array([x, y, z]).T * np.array(e)[:, None]))
+
+
+def test_a_take_longer_than_a_c3d_header_can_count(start_host, tmp_path):
+    app = Client(start_host("--scene", "empty", "--frames", "70000"))
+    subject = app.SceneCreateObject("Subject", "S", app.SceneGetObject("/")[0], "")[0]
+    marker = app.SceneCreateObject("Marker", "M", subject, "")[0]
+    app.SetTrajectoryAtFrame("S", "M", 70000, 1.5, 2.5, 3.5, True)
+    app.ExportFile(str(tmp_path / "long.c3d"), "c3d")
+    labels, _, _, frames = read_c3d(tmp_path / "long.c3d")
+    assert labels == ["S:M"] and len(frames) == 70000
+    assert list(frames[-1][1][0][:4]) == [1.5, 2.5, 3.5, 0] and frames[-2][1][0][3] == -1
+    app.ImportFile(str(tmp_path / "long.c3d"), "", False)
+    assert app.GetTrajectoryAtFrame("S", "M", 70000) == (1.5, 2.5, 3.5, True)
+    assert marker not in app.SceneGetObjectList("Marker")[0]
+    app.close()
+
+
+@pytest.mark.parametrize("analog", [0, 3])
+def test_c3d_from_an_independent_writer_replaces_the_scene(app, tmp_path, analog):
+    seen = [[(i, -f, 0.25 * f), None if f % 3 == 0 else (1e4, 2, f)] for f, i in enumerate(range(7))]
+    write_c3d(tmp_path / "jump.c3d", ["Carol:HEAD", "TOE"], seen, rate=250.0, analog=analog)
+    app.ImportFile(str(tmp_path / "jump.c3d"), "", False)
+    assert app.GetSceneName() == ("jump", "")
+    assert app.GetFrameCount() == 7 and app.TimelineGetFrameRate() == 250.0
+    assert app.GetSubjectNames()[0] == ["Carol", "Unlabeled"]
+    assert app.GetTrajectory("Carol", "HEAD") == ([0, 1, 2, 3, 4, 5, 6], [0, -1, -2, -3, -4, -5, -6],
+                                                  [0.25 * f for f in range(7)], [True] * 7)
+    x, _, z, e = app.GetTrajectory("Unlabeled", "TOE")
+    assert e == [f % 3 != 0 for f in range(7)]
+    assert x == [1e4 if s else 0 for s in e] and z == [f if s else 0 for f, s in enumerate(e)]
+
+
+def test_merge_writes_the_file_into_the_scene(app, tmp_path):
+    bob = trajectories(app)
+    points = [[(f, 1, 2), (3, 4, f)] for f in range(50)]
+    write_c3d(tmp_path / "more.c3d", ["Alice:LFHD", "Dave:NOSE"], points)
+    app.ImportFile(str(tmp_path / "more.c3d"), "c3d", True)
+    after = trajectories(app)
+    assert after.pop("Alice:LFHD") == (list(range(50)), [1] * 50, [2] * 50, [True] * 50)
+    assert after.pop("Dave:NOSE") == ([3] * 50, [4] * 50, list(range(50)), [True] * 50)
+    del bob["Alice:LFHD"]
+    assert after == bob
+    assert app.GetSceneName() == ("Demo", "") and app.GetSubjectNames()[0] == ["Alice", "Bob", "Dave"]
+
+
+def test_c3d_round_trip_keeps_float_values_and_gaps(app, start_host, tmp_path):
+    app.SetTrajectoryAtFrame("Bob", "C7", 3, 0.1, -1e6, 123.456, True)
+    app.ExportFile(str(tmp_path / "t.c3d"), "")
+    other = Client(start_host("--scene", "empty"))
+    other.ImportFile(str(tmp_path / "t.c3d"), "", False)
+    rounded = {name: tuple(list(np.float32(axis).astype(float)) for axis in t[:3]) + (t[3],)
+               for name, t in trajectories(app).items()}
+    assert seen(trajectories(other)) == seen(rounded) and other.GetFrameCount() == 50
+    other.close()
+
+
+def test_csv_export_has_one_row_per_frame_and_round_trips_exactly(app, start_host, tmp_path):
+    alice = app.SceneGetObject("/Alice")[0]
+    app.ObjectSetAttributeValue(alice, "Name", 'Al, "the" walker')
+    lank = app.SceneGetObject('/Al, "the" walker/LANK')[0]
+    y = int(app.ObjectGetChannel(lank, "Y")[2])
+    app.ChannelSetValue(lank, y, 5, 0, 0, "0.30000000000000004", "")
+    app.ChannelDeleteKey(lank, y, 6)
+    path = tmp_path / "walk.csv"
+    app.ExportFile(str(path), "")
+    with open(path, newline="") as handle:
+        rows = list(csv.reader(handle))
+    expected = trajectories(app)
+    assert rows[0] == ["Frame"] + [f"{name}:{axis}" for name in expected for axis in "XYZ"]
+    assert [row[0] for row in rows[1:]] == [str(f) for f in range(1, 51)]
+    column = rows[0].index('Al, "the" walker:LANK:Y')
+    assert rows[5][column] == "0.30000000000000004" and rows[6][column] == ""
+    other = Client(start_host("--scene", "empty", "--frames", "3"))
+    other.TimelineSetFrameRate(60.0)
+    other.ImportFile(str(path), "CSV", False)
+    assert seen(trajectories(other)) == seen(expected)
+    assert other.GetFrameCount() == 50 and other.TimelineGetFrameRate() == 60.0
+    other.close()
+
+
+def test_csv_written_elsewhere_is_imported(app, tmp_path):
+    path = tmp_path / "hand.csv"
+    with open(path, "w", newline="") as handle:
+        out = csv.writer(handle)  # CR LF line ends
+        out.writerow(["Frame", "Eve:TIP:X", "Eve:TIP:Y", "Eve:TIP:Z"])
+        out.writerows([[11 + f, f, "", 1e-3] for f in range(50)])
+    app.ImportFile(str(path), "csv", True)
+    x, y, z, e = app.GetTrajectory("Eve", "TIP")
+    assert x == list(range(50)) and z == [1e-3] * 50 and e == [False] * 50
+    tip = app.SceneGetObject("/Eve/TIP")[0]
+    channel = int(app.ObjectGetChannel(tip, "X")[2])
+    assert app.ChannelGetGaps(tip, channel, 0) == ""
+    assert app.ChannelGetGaps(tip, int(app.ObjectGetChannel(tip, "Y")[2]), 0) == "1-50"
+
+
+def c3d_header(file, **fields):
+    """A C3D file with words of its header changed."""
+    layout = {"key": (1, "B"), "points": (2, "<H"), "scale": (12, "<f"), "data": (16, "<H"), "rate": (20, "<f"),
+              "parameters": (0, "B")}
+    data = bytearray(file)
+    for name, value in fields.items():
+        offset, form = layout[name]
+        struct.pack_into(form, data, offset, value)
+    return bytes(data)
+
+
+def damaged_c3d(data):
+    """A good C3D file broken in the ways a file can be: cut short, its header or parameters wrong."""
+    parameters = data.index(b"POINT") - 6  # the parameter section's start
+    labels = data.index(b"LABELS")
+    yield from (data[:cut] for cut in (0, 100, 511, parameters + 40, len(data) // 2, len(data) - 600))
+    yield c3d_header(data, key=0x51)
+    yield c3d_header(data, parameters=0)
+    yield c3d_header(data, parameters=200)
+    yield c3d_header(data, points=60000)
+    start = data.index(b"ACTUAL_START_FIELD") + 23
+    yield data[:start] + struct.pack("<HH", 100, 0) + data[start + 4:]  # starts after it ends
+    yield c3d_header(data, data=1)
+    yield c3d_header(data, data=60000)
+    yield c3d_header(data, rate=float("nan"))
+    yield c3d_header(data, scale=0.0)
+    yield data[:parameters + 3] + bytes([85]) + data[parameters + 4:]  # DEC processor
+    yield data[:labels + 6] + b"\xff\x7f" + data[labels + 8:]  # offset past the section
+    yield data[:labels] + b"LABELX" + data[labels + 6:]  # the labels missing
+    end = data.index(b"ACTUAL_END_FIELD") + 21
+    yield data[:end] + struct.pack("<HH", 0xffff, 0x7fff) + data[end + 4:]  # two thousand million frames
+
+
+def damaged_csv(text):
+    lines = text.split("\n")
+    yield from (text[:cut] for cut in (0, 5, len(text) // 2, len(text) - 3))
+    yield text.replace("Frame", "Time", 1)
+    yield text.replace("LFHD:Y", "LFHD:Q", 1)
+    yield text.replace("RFHD:X", "RFHX:X", 1)
+    yield text.replace(":Z\n", ":Z,Extra\n", 1)
+    yield "\n".join(lines[:3] + [lines[3] + ","] + lines[4:])
+    for cell in ("1e999", "nan", "abc", "0x10"):
+        row = lines[3].split(",")
+        yield "\n".join(lines[:3] + [",".join(row[:2] + [cell] + row[3:])] + lines[4:])
+    yield "\n".join(lines[:3] + lines[4:])  # a frame left out
+    yield text.replace("Alice:LFHD:X", '"Alice:LFHD:X', 1)
+    yield text.replace("Alice:LFHD:X", 'Alice:"LFHD":X', 1)
+    yield text.replace("\n", "\r", 1)
+    yield text.replace("Bob:C7", "Alice:C7")  # a point twice
+    yield text.replace("Bob:C7", "Bob:", 1).replace("Bob:C7", "Bob:")
+    yield lines[0] + "\n"  # no frames
+
+
+@pytest.mark.parametrize("kind", ["c3d", "csv"])
+def test_damaged_files_are_refused_and_the_scene_is_kept(app, tmp_path, kind):
+    good = tmp_path / f"good.{kind}"
+    app.ExportFile(str(good), "")
+    app.SetTrajectoryAtFrame("Alice", "C7", 9, 1, 2, 3, True)
+    before = state(app)
+    bad = tmp_path / f"bad.{kind}"
+    damaged = damaged_c3d(good.read_bytes()) if kind == "c3d" else (t.encode() for t in damaged_csv(good.read_text()))
+    for number, data in enumerate(damaged):
+        bad.write_bytes(data)
+        for merge in (False, True):
+            code, message = app.refusal("ImportFile", str(bad), "", merge)
+            assert code == m.ApplicationError, (number, message)
+            assert message.startswith(("the C3D file is damaged: ", "the CSV file is damaged at line ",
+                                       "the point ")), (number, message)
+    assert state(app) == before
+
+
+def test_refusals_name_the_reason_and_keep_the_scene(app, tmp_path):
+    write_c3d(tmp_path / "short.c3d", ["A:B"], [[(1, 2, 3)]] * 10)
+    write_c3d(tmp_path / "ntsc.c3d", ["A:B"], [[(1, 2, 3)]] * 50, rate=29.97)
+    write_c3d(tmp_path / "camera.c3d", ["Camera1:B"], [[(1, 2, 3)]] * 50)
+    before = state(app)
+    cases = [
+        ("ImportFile", str(tmp_path / "short.c3d"), "", True), "the file has 10 frames and the take 50: a merge needs the same number",
+        ("ImportFile", str(tmp_path / "ntsc.c3d"), "", False), f"the file's frame rate {np.float32(29.97).item()!r} is not one the timeline supports",
+        ("ImportFile", str(tmp_path / "camera.c3d"), "", True), "the point 'Camera1:B' cannot be imported: 'Camera1' is a Camera",
+        ("ImportFile", str(tmp_path / "none.c3d"), "", True), f"cannot read the file '{tmp_path / 'none.c3d'}'",
+        ("ImportFile", str(tmp_path / "short.c3d"), "trc", True), f"no file format 'trc' (csv or c3d) for '{tmp_path / 'short.c3d'}'",
+        ("ImportFile", str(tmp_path / "notes.txt"), "", True), f"no file format 'txt' (csv or c3d) for '{tmp_path / 'notes.txt'}'",
+        ("ImportFile", "", "csv", True), "a file path cannot be empty",
+        ("ExportFile", str(tmp_path / "no" / "x.csv"), ""), f"cannot write the file '{tmp_path / 'no' / 'x.csv'}'",
+        ("ExportFile", str(tmp_path / "x"), ""), f"no file format '' (csv or c3d) for '{tmp_path / 'x'}'",
+    ]
+    for args, message in zip(cases[::2], cases[1::2]):
+        assert app.refusal(*args) == (m.ApplicationError, message)
+    assert state(app) == before
+    assert not (tmp_path / "x").exists()
+
+
+@pytest.mark.parametrize("marker, value, message", [
+    ("a:b", "1", "the marker 'Alice/a:b' cannot be exported: a ':' in its name"),
+    ("big", "1e300", "the marker 'Alice:big' holds 1e+300, too large for a C3D file"),
+])
+def test_markers_a_c3d_file_cannot_hold_are_refused(app, tmp_path, marker, value, message):
+    created = app.SceneCreateObject("Marker", marker, app.SceneGetObject("/Alice")[0], "")[0]
+    app.ChannelSetValue(created, int(app.ObjectGetChannel(created, "X")[2]), 1, 0, 0, value, "")
+    for axis in "YZ":
+        app.ChannelSetValue(created, int(app.ObjectGetChannel(created, axis)[2]), 1, 0, 0, "0", "")
+    assert app.refusal("ExportFile", str(tmp_path / "x.c3d"), "") == (m.ApplicationError, message)
+    assert not (tmp_path / "x.c3d").exists()
