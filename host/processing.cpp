@@ -88,20 +88,19 @@ void Cubic(Fill& fill, std::size_t frames) {
   }
 }
 
-void OfflineFixOcclusion(Context& context, Reader& in, Writer&) {
-  Scene& scene = context.scene;
-  std::string_view name = in.Text(), options = in.Text();
-  if (!options.empty()) Refuse("'OfflineFixOcclusion' takes no options: '" + std::string(options) + "'");
-  std::vector<Object*> subjects;
-  if (name.empty()) {
-    subjects = scene.OfType(scene.Root(), "Subject");
-  } else if (Object* s = scene.FindSubject(name)) {
-    subjects = {s};
-  } else {
-    Refuse("no subject named '" + std::string(name) + "'");
-  }
+// The subjects a stage works on: the one named, or every subject for an empty name.
+std::vector<Object*> SubjectsOf(Scene& scene, std::string_view name) {
+  if (name.empty()) return scene.OfType(scene.Root(), "Subject");
+  if (Object* s = scene.FindSubject(name)) return {s};
+  Refuse("no subject named '" + std::string(name) + "'");
+}
+
+void NoOptions(std::string_view command, std::string_view options) {
+  if (!options.empty()) Refuse("'" + std::string(command) + "' takes no options: '" + std::string(options) + "'");
+}
+
+std::string FixOcclusion(Scene& scene, const std::vector<Object*>& subjects) {
   const Settings& settings = scene.settings;
-  if (!settings.Flag(Record::OcclusionFixing, "Enabled")) Refuse("occlusion fixing is off (OcclusionFixing setting 'Enabled')");
   double longest = std::floor(settings.Number(Record::OcclusionFixing, "TransitionTime") * scene.timeline.rate + 1e-9);
   bool apply = settings.Flag(Record::OcclusionFixing, "ApplyFixedMarkers");
   auto frames = static_cast<std::size_t>(scene.frames);
@@ -140,12 +139,195 @@ void OfflineFixOcclusion(Context& context, Reader& in, Writer&) {
     }
     filled += fills.size();
   }
-  LogLine("info", "fix occlusion: " + std::to_string(filled) + " gaps filled (" + std::to_string(rigid) + " from a neighbour), " +
-                      std::to_string(left) + " left");
+  return "filled=" + std::to_string(filled) + ",rigid=" + std::to_string(rigid) + ",left=" + std::to_string(left);
+}
+
+// ---- The pipeline -------------------------------------------------------------------------------
+//
+// What has run on the take is kept on its active clip, one Text parameter per stage (and subject,
+// for the stages of a subject): "Pipeline STAGE" or "Pipeline STAGE SUBJECT", whose value is the
+// stage's result and the settings it ran with. A stage runs only when the stages it needs have run.
+
+enum class Stage {
+  CalibrateCameras, Reconstruct, LabelROM, CalibrateLabelingSubjects, AutoLabel, FixOcclusion,
+  CreateSolvingSetupFromLS, CalibrateSolvingSubjects, Solve, Retarget,
+};
+
+struct StagePlan {
+  std::string_view name;  // the command's name
+  bool perSubject;
+  std::vector<Stage> needs;
+  int settings;  // the Record it reads, or -1
+};
+
+const StagePlan& PlanOf(Stage stage) {
+  static const StagePlan plans[] = {
+      {"OfflineCalibrateCameras", false, {}, static_cast<int>(Record::CircleFit)},
+      {"OfflineReconstruct", false, {Stage::CalibrateCameras}, static_cast<int>(Record::Reconstruct)},
+      {"OfflineLabelROM", true, {Stage::Reconstruct}, static_cast<int>(Record::LabelROM)},
+      {"OfflineCalibrateLabelingSubjects", true, {Stage::LabelROM}, static_cast<int>(Record::LabelingSubjectCalibration)},
+      {"OfflineAutoLabel", true, {Stage::Reconstruct, Stage::CalibrateLabelingSubjects}, static_cast<int>(Record::Labeling)},
+      {"OfflineFixOcclusion", true, {}, static_cast<int>(Record::OcclusionFixing)},
+      {"OfflineCreateSolvingSetupFromLS", true, {Stage::CalibrateLabelingSubjects}, -1},
+      {"OfflineCalibrateSolvingSubjects", true, {Stage::CreateSolvingSetupFromLS}, static_cast<int>(Record::Solving)},
+      {"OfflineSolve", true, {Stage::CalibrateSolvingSubjects}, static_cast<int>(Record::Solving)},
+      {"OfflineRetarget", true, {Stage::Solve}, -1},
+  };
+  return plans[static_cast<int>(stage)];
+}
+
+std::string StateName(Stage stage, const Object* subject) {
+  std::string name = "Pipeline ";
+  name.append(PlanOf(stage).name);
+  if (subject) name.append(1, ' ').append(subject->name);
+  return name;
+}
+
+Object& TakeOf(Scene& scene) {
+  Object* clip = scene.Find(scene.activeClip);
+  if (!clip) Refuse("the pipeline's state is kept on the active clip, and there is none");
+  return *clip;
+}
+
+// Refuses, naming the stage that must run first, unless every stage `stage` needs has run for every
+// subject in `subjects`.
+void CheckNeeds(Scene& scene, Stage stage, const std::vector<Object*>& subjects) {
+  Object& take = TakeOf(scene);
+  for (Stage need : PlanOf(stage).needs) {
+    const StagePlan& plan = PlanOf(need);
+    std::vector<const Object*> scope(subjects.begin(), subjects.end());
+    if (!plan.perSubject) scope = {nullptr};
+    for (const Object* s : scope)
+      if (!take.FindParameter(StateName(need, s))) {
+        std::string why(1, '\'');
+        why.append(PlanOf(stage).name).append("' needs '").append(plan.name).append("' to run first");
+        if (s) why.append(" for subject '").append(s->name).append(1, '\'');
+        Refuse(why);
+      }
+  }
+}
+
+void Remember(Scene& scene, Stage stage, const Object* subject, std::string result) {
+  const StagePlan& plan = PlanOf(stage);
+  if (plan.settings >= 0) result.append(1, ';').append(scene.settings.Summary(static_cast<Record>(plan.settings)));
+  Object& take = TakeOf(scene);
+  std::string name = StateName(stage, subject);
+  Parameter* p = take.FindParameter(name);
+  if (!p) take.parameters.push_back({NewId(), name, ParameterKind::Text, "", "", "", false}), p = &take.parameters.back();
+  p->value = result;
+  LogLine("info", name + ": " + result);
+}
+
+std::size_t SeenFrames(const Track& t, std::size_t frames) {
+  std::size_t seen = 0;
+  for (std::size_t f = 0; f < frames; ++f) seen += t.Seen(f);
+  return seen;
+}
+
+// Runs one stage, its needs already checked. Returns nothing; its results are in the take's state.
+void RunStage(Scene& scene, Stage stage, const std::vector<Object*>& subjects) {
+  auto frames = static_cast<std::size_t>(scene.frames);
+  switch (stage) {
+    case Stage::CalibrateCameras: {
+      std::size_t cameras = scene.OfType(scene.Root(), "Camera").size();
+      if (cameras < 2) Refuse("'OfflineCalibrateCameras' needs at least two cameras in the scene, and there are " + std::to_string(cameras));
+      Remember(scene, stage, nullptr, "cameras=" + std::to_string(cameras));
+      return;
+    }
+    case Stage::Reconstruct: {
+      std::size_t markers = 0, seen = 0;
+      for (Object* s : scene.OfType(scene.Root(), "Subject"))
+        for (const Track& t : TracksOf(scene, *s)) ++markers, seen += SeenFrames(t, frames);
+      Remember(scene, stage, nullptr, "trajectories=" + std::to_string(markers) + ",seen=" + std::to_string(seen));
+      return;
+    }
+    case Stage::FixOcclusion: {
+      for (Object* s : subjects) Remember(scene, stage, s, FixOcclusion(scene, {s}));
+      return;
+    }
+    default: break;
+  }
+  for (Object* s : subjects) {
+    std::vector<Track> tracks = TracksOf(scene, *s);
+    std::string result;
+    switch (stage) {
+      case Stage::LabelROM:
+      case Stage::CalibrateLabelingSubjects:
+      case Stage::AutoLabel: {
+        std::size_t seen = 0;
+        for (const Track& t : tracks) seen += SeenFrames(t, frames) > 0;
+        result = "markers=" + std::to_string(tracks.size()) + ",labelled=" + std::to_string(seen);
+        break;
+      }
+      case Stage::CreateSolvingSetupFromLS:
+      case Stage::CalibrateSolvingSubjects: {
+        std::size_t tied = 0;
+        for (const Track& t : tracks) tied += !t.bone.empty();
+        result = "bones=" + std::to_string(scene.Bones(*s).size()) + ",constraints=" + std::to_string(tied);
+        break;
+      }
+      default: {  // solving and retargeting: the frames where every marker is seen
+        std::size_t whole = 0;
+        for (std::size_t f = 0; f < frames; ++f) {
+          bool all = true;
+          for (const Track& t : tracks) all = all && t.Seen(f);
+          whole += all;
+        }
+        result = "frames=" + std::to_string(whole);
+        break;
+      }
+    }
+    Remember(scene, stage, s, result);
+  }
+}
+
+// The handlers of the stages: the inputs are read in the catalogue's order (an Options string is
+// refused unless empty), every need is checked, then the stage runs.
+template <Stage S, bool Subject, bool Options>
+void Run(Context& context, Reader& in, Writer&) {
+  Scene& scene = context.scene;
+  std::string_view name = Subject ? in.Text() : std::string_view();
+  if constexpr (Options) NoOptions(PlanOf(S).name, in.Text());
+  std::vector<Object*> subjects = PlanOf(S).perSubject ? SubjectsOf(scene, name) : std::vector<Object*>();
+  CheckNeeds(scene, S, subjects);
+  if (S == Stage::FixOcclusion && !scene.settings.Flag(Record::OcclusionFixing, "Enabled"))
+    Refuse("occlusion fixing is off (OcclusionFixing setting 'Enabled')");
+  RunStage(scene, S, subjects);
+}
+
+// The quick post-processing run: labelling, occlusion fixing and solving, in that order, stopping at
+// the first stage that cannot run (the stages before it keep their results).
+constexpr Stage kQuickPost[] = {Stage::AutoLabel, Stage::FixOcclusion, Stage::Solve};
+
+void OfflineQuickPost(Context& context, Reader& in, Writer&) {
+  Scene& scene = context.scene;
+  std::string_view name = in.Text();
+  NoOptions("OfflineQuickPost", in.Text());
+  std::vector<Object*> subjects = SubjectsOf(scene, name);
+  for (Stage stage : kQuickPost) {
+    try {
+      CheckNeeds(scene, stage, subjects);
+      if (stage == Stage::FixOcclusion && !scene.settings.Flag(Record::OcclusionFixing, "Enabled"))
+        Refuse("occlusion fixing is off (OcclusionFixing setting 'Enabled')");
+      RunStage(scene, stage, subjects);
+    } catch (const Failure& failure) {
+      Refuse("quick post stopped at '" + std::string(PlanOf(stage).name) + "': " + failure.message);
+    }
+  }
 }
 
 constexpr HandlerEntry kHandlers[] = {
-    {Id::OfflineFixOcclusion, &OfflineFixOcclusion},
+    {Id::OfflineCalibrateCameras, &Run<Stage::CalibrateCameras, false, true>},
+    {Id::OfflineReconstruct, &Run<Stage::Reconstruct, false, true>},
+    {Id::OfflineLabelROM, &Run<Stage::LabelROM, true, true>},
+    {Id::OfflineCalibrateLabelingSubjects, &Run<Stage::CalibrateLabelingSubjects, true, true>},
+    {Id::OfflineAutoLabel, &Run<Stage::AutoLabel, true, true>},
+    {Id::OfflineFixOcclusion, &Run<Stage::FixOcclusion, true, true>},
+    {Id::OfflineCreateSolvingSetupFromLS, &Run<Stage::CreateSolvingSetupFromLS, true, false>},
+    {Id::OfflineCalibrateSolvingSubjects, &Run<Stage::CalibrateSolvingSubjects, true, true>},
+    {Id::OfflineSolve, &Run<Stage::Solve, true, false>},
+    {Id::OfflineRetarget, &Run<Stage::Retarget, true, false>},
+    {Id::OfflineQuickPost, &OfflineQuickPost},
 };
 
 }  // namespace

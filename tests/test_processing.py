@@ -105,3 +105,109 @@ def test_a_refused_fix_changes_nothing(app, tmp_path, subject, options, setting,
     assert message in app.refusal("OfflineFixOcclusion", subject, options)[1]
     app.SaveFile(str(tmp_path / "after.scene"), "")
     assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+
+
+# ---- The pipeline: the order of the stages, their preconditions and their recorded results ----
+
+CHAIN = [  # (operation, arguments) in an order that meets every precondition, for Alice
+    ("OfflineCalibrateCameras", ("",)),
+    ("OfflineReconstruct", ("",)),
+    ("OfflineLabelROM", ("Alice", "")),
+    ("OfflineCalibrateLabelingSubjects", ("Alice", "")),
+    ("OfflineAutoLabel", ("Alice", "")),
+    ("OfflineFixOcclusion", ("Alice", "")),
+    ("OfflineCreateSolvingSetupFromLS", ("Alice",)),
+    ("OfflineCalibrateSolvingSubjects", ("Alice", "")),
+    ("OfflineSolve", ("Alice",)),
+    ("OfflineRetarget", ("Alice",)),
+]
+
+
+def state(app):
+    """The take's pipeline state: the active clip's Text parameters, by name."""
+    clip = app.SceneGetObject("/Walk")[0]
+    return {app.ParameterGet(clip, p, 2, "Name"): app.ParameterGet(clip, p, 2, "Value") for p in app.ObjectGetParameters(clip, 2)}
+
+
+def seen_frames(app, subject):
+    return np.array([trajectory(app, subject, marker)[1] for marker in app.GetMarkerNames(subject)])
+
+
+def test_the_stages_record_their_documented_results_in_order(app):
+    seen = sum(int(seen_frames(app, s).sum()) for s in ("Alice", "Bob"))
+    expected = {
+        "OfflineCalibrateCameras": "cameras=4;Enabled=true,",
+        "OfflineReconstruct": f"trajectories=24,seen={seen};EnvironmentalDriftTolerance=1.5,",
+        "OfflineLabelROM Alice": "markers=12,labelled=12;StandardDeviation=2,",
+        "OfflineCalibrateLabelingSubjects Alice": "markers=12,labelled=12;RestImportance=1,",
+        "OfflineAutoLabel Alice": "markers=12,labelled=12;UseLabelingClusters=true,",
+        "OfflineFixOcclusion Alice": "filled=3,rigid=1,left=1;Enabled=true,",
+        "OfflineCreateSolvingSetupFromLS Alice": "bones=13,constraints=12",
+        "OfflineCalibrateSolvingSubjects Alice": "bones=13,constraints=12;PriorImportance=1,",
+        "OfflineSolve Alice": "frames=920;PriorImportance=1,",
+        "OfflineRetarget Alice": "frames=920",
+    }
+    for number, (operation, args) in enumerate(CHAIN):
+        getattr(app, operation)(*args)
+        recorded = state(app)
+        assert len(recorded) == number + 1
+        key = "Pipeline " + operation + (" Alice" if args[0] == "Alice" else "")
+        assert recorded[key].startswith(expected[key[len("Pipeline "):]])
+    assert seen_frames(app, "Alice").all(axis=0).sum() == 920
+
+
+NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the refusal)
+    (0, "OfflineReconstruct", ("",), "'OfflineReconstruct' needs 'OfflineCalibrateCameras' to run first"),
+    (1, "OfflineLabelROM", ("Alice", ""), "'OfflineLabelROM' needs 'OfflineReconstruct' to run first"),
+    (2, "OfflineCalibrateLabelingSubjects", ("Alice", ""), "needs 'OfflineLabelROM' to run first for subject 'Alice'"),
+    (3, "OfflineAutoLabel", ("Alice", ""), "needs 'OfflineCalibrateLabelingSubjects' to run first for subject 'Alice'"),
+    (3, "OfflineCreateSolvingSetupFromLS", ("Alice",), "needs 'OfflineCalibrateLabelingSubjects' to run first for subject 'Alice'"),
+    (6, "OfflineCalibrateSolvingSubjects", ("Alice", ""), "needs 'OfflineCreateSolvingSetupFromLS' to run first for subject 'Alice'"),
+    (7, "OfflineSolve", ("Alice",), "needs 'OfflineCalibrateSolvingSubjects' to run first for subject 'Alice'"),
+    (8, "OfflineRetarget", ("Alice",), "needs 'OfflineSolve' to run first for subject 'Alice'"),
+    (9, "OfflineSolve", ("",), "needs 'OfflineCalibrateSolvingSubjects' to run first for subject 'Bob'"),
+    (0, "OfflineLabelROM", ("Carol", ""), "no subject named 'Carol'"),
+    (0, "OfflineReconstruct", ("fast",), "'OfflineReconstruct' takes no options: 'fast'"),
+]
+
+
+@pytest.mark.parametrize("ran, operation, args, message", NEEDS)
+def test_a_stage_whose_need_has_not_run_is_refused_and_changes_nothing(app, tmp_path, ran, operation, args, message):
+    for earlier, earlier_args in CHAIN[:ran]:
+        getattr(app, earlier)(*earlier_args)
+    app.SaveFile(str(tmp_path / "before.scene"), "")
+    assert message in app.refusal(operation, *args)[1]
+    app.SaveFile(str(tmp_path / "after.scene"), "")
+    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+
+
+def test_camera_calibration_needs_two_cameras(app):
+    app.NewScene()
+    assert "needs at least two cameras in the scene, and there are 0" in app.refusal("OfflineCalibrateCameras", "")[1]
+
+
+def test_quick_post_runs_its_stages_in_order_and_stops_at_the_first_that_cannot_run(app):
+    assert app.refusal("OfflineQuickPost", "Alice", "")[1] == (
+        "quick post stopped at 'OfflineAutoLabel': 'OfflineAutoLabel' needs 'OfflineReconstruct' to run first")
+    assert state(app) == {}
+    for operation, args in CHAIN[:4]:
+        getattr(app, operation)(*args)
+    assert app.refusal("OfflineQuickPost", "Alice", "")[1] == (
+        "quick post stopped at 'OfflineSolve': 'OfflineSolve' needs 'OfflineCalibrateSolvingSubjects' to run first for subject 'Alice'")
+    assert {"Pipeline OfflineAutoLabel Alice", "Pipeline OfflineFixOcclusion Alice"} <= set(state(app))
+    assert "Pipeline OfflineSolve Alice" not in state(app)
+    for operation, args in CHAIN[6:8]:
+        getattr(app, operation)(*args)
+    app.OfflineQuickPost("Alice", "")
+    assert state(app)["Pipeline OfflineSolve Alice"].startswith("frames=920;")
+
+
+def test_a_stage_records_the_settings_it_ran_with(app):
+    for operation, args in CHAIN[:8]:
+        getattr(app, operation)(*args)
+    settings = app.record("OfflineGetSolvingSettings")
+    m.Output_SolvingSettings_PriorImportance_set(settings, 5.5)
+    app.OfflineSetSolvingSettings(settings)
+    app.OfflineSolve("Alice")
+    assert "PriorImportance=5.5," in state(app)["Pipeline OfflineSolve Alice"]
+    assert "PriorImportance=1," in state(app)["Pipeline OfflineCalibrateSolvingSubjects Alice"]
