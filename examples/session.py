@@ -10,6 +10,8 @@ from __future__ import annotations
 
 import argparse
 import contextlib
+import os
+import tempfile
 from typing import Iterator, List, Sequence, Tuple
 
 import matplotlib
@@ -64,6 +66,31 @@ def account(client: Client3.ZarvoPelluxPostClient) -> None:
             print(f"  {marker!s:<6} seen in {sum(seen):5d} frames, {len(gaps(seen))} gap(s)")
 
 
+def tree(client: Client3.ZarvoPelluxPostClient) -> None:
+    """The top of the scene's object tree."""
+    root = client.SceneGetObject("/").check()
+    children = client.ObjectGetChildren(root.ID).check()
+    print("objects:")
+    for child, kind in zip(children.IDList, children.TypeList):
+        path = client.ObjectGetPath(child).check().Str
+        below = len(client.ObjectGetDescendants(child).check().IDList)
+        print(f"  {path!s:<10} {kind!s:<8} {below:3d} objects below")
+
+
+def save_and_reload(client: Client3.ZarvoPelluxPostClient) -> None:
+    """Saves the scene, replaces it with an empty one, and loads it back."""
+    before = [str(name) for name in client.GetSubjectNames().check().Names]
+    with tempfile.TemporaryDirectory() as folder:
+        path = os.path.join(folder, "demo.scene")
+        client.SaveFile(path, "").check()
+        client.NewScene().check()
+        emptied = len(client.GetSubjectNames().check().Names)
+        client.LoadFile(path).check()
+    after = [str(name) for name in client.GetSubjectNames().check().Names]
+    print(f"saved, emptied ({emptied} subjects) and reloaded: subjects {', '.join(after)}"
+          f"{'' if after == before else ' (changed!)'}")
+
+
 def plot(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str, path: str) -> None:
     trajectory = client.GetTrajectory(subject, marker).check()
     seen = list(trajectory.E)
@@ -98,6 +125,8 @@ def main() -> None:
     with application(options.address, options.port) as (address, port):
         with Client3.connect(address, port) as client:
             account(client)
+            tree(client)
+            save_and_reload(client)
             plot(client, options.subject, options.marker, options.plot)
 
 

@@ -22,6 +22,8 @@ def test_session_prints_the_account_and_writes_the_plot(tmp_path):
     assert lines[1] == "scene 'Demo', frames 1 to 1000 at 100 Hz (10 s)"
     assert "subject Alice:" in lines and "subject Bob:" in lines
     assert "  RWRA   seen in   920 frames, 1 gap(s)" in lines
+    assert "  /Alice     Subject   37 objects below" in lines
+    assert "saved, emptied (0 subjects) and reloaded: subjects Alice, Bob" in lines
     with open(tmp_path / "session.png", "rb") as plot:
         assert plot.read(8) == b"\x89PNG\r\n\x1a\n"
 
