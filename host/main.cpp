@@ -28,11 +28,11 @@ bool ParseInt(std::string_view text, int& out, int least, int most) {
 }
 
 // KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, frames=N.
-bool ParseFault(std::string_view spec, Options& options) {
+bool ParseFault(std::string_view fault, Options& options) {
   std::string command;
-  if (auto at = spec.find('@'); at != std::string_view::npos) command = spec.substr(at + 1), spec = spec.substr(0, at);
-  std::string_view kind = spec.substr(0, spec.find('='));
-  std::string_view value = kind.size() < spec.size() ? spec.substr(kind.size() + 1) : std::string_view();
+  if (auto at = fault.find('@'); at != std::string_view::npos) command = fault.substr(at + 1), fault = fault.substr(0, at);
+  std::string_view kind = fault.substr(0, fault.find('='));
+  std::string_view value = kind.size() < fault.size() ? fault.substr(kind.size() + 1) : std::string_view();
   int number = 0;
   if (!value.empty() && !ParseInt(value, number, -2147483647, 2147483647)) return false;
   if (kind == "frames") return number >= 0 && (options.faults.framesPerFrame = number, true);
@@ -53,7 +53,7 @@ int Usage(const char* problem) {
                "  --scene SCENE    demo (default), empty, or a scene file\n"
                "  --frames N       frames of the demo and empty scenes, 1 to 1000000 (default 1000)\n"
                "  --max-clients N  clients served at once (default 64)\n"
-               "  --fault SPEC     test only: misbehave as SPEC says (see the reference page)\n");
+               "  --fault FAULT    test only: misbehave as FAULT says (see the reference page)\n");
   return problem ? 2 : 0;
 }
 

@@ -77,9 +77,9 @@ def test_the_bare_proxies_of_the_module_are_recognised():
 def test_the_bridge_joins_the_ring_when_imported_before_the_module():
     code = (
         "import importlib.util, sys\n"
-        f"spec = importlib.util.spec_from_file_location('Client3._buffers', {_buffers.__file__!r})\n"
-        "buffers = importlib.util.module_from_spec(spec)\n"
-        "spec.loader.exec_module(buffers)\n"
+        f"found = importlib.util.spec_from_file_location('Client3._buffers', {_buffers.__file__!r})\n"
+        "buffers = importlib.util.module_from_spec(found)\n"
+        "found.loader.exec_module(buffers)\n"
         "assert '_Client3' not in sys.modules\n"
         "import _Client3\n"
         "vector = _Client3.new_vectord([0.5, 1.5])\n"
