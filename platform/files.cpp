@@ -11,6 +11,8 @@
 #define WIN32_LEAN_AND_MEAN
 #endif
 #include <windows.h>
+// <windows.h> names its own ReplaceFile as a macro for ReplaceFileA/W; ours keeps its name.
+#undef ReplaceFile
 #else
 #include <dirent.h>
 #include <sys/stat.h>
