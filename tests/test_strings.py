@@ -170,6 +170,7 @@ class Unprintable(Exception):
 @pytest.mark.parametrize("pending, result", [
     (None, (RuntimeError, "more")), (ValueError("old"), (ValueError, "old more")),
     (KeyError("k"), (KeyError, "'k' more")), (IndexError, (IndexError, "more")), (Unprintable(), (Unprintable, "more")),
+    (ValueError(""), (ValueError, "more")),
 ])
 def test_add_error_msg(peer, pending, result):
     error = pytest.raises(Exception, peer.add_error_msg, pending, "more").value
