@@ -13,6 +13,7 @@
 
 #include "host/scenefile.h"
 #include "host/server.h"
+#include "host/text.h"
 #include "platform/net.h"
 
 using namespace client3::host;
@@ -23,8 +24,10 @@ std::atomic<bool> stopRequested{false};
 void RequestStop() { stopRequested = true; }
 
 bool ParseInt(std::string_view text, int& out, int least, int most) {
-  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), out);
-  return error == std::errc() && end == text.data() + text.size() && out >= least && out <= most;
+  std::optional<int> value = ParseNumber<int>(text);
+  if (!value || *value < least || *value > most) return false;
+  out = *value;
+  return true;
 }
 
 // KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, frames=N.

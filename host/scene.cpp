@@ -1,5 +1,6 @@
 // The scene's object tree and the demonstration take.
 #include "host/scene.h"
+#include "host/text.h"
 
 #include <algorithm>
 #include <atomic>
@@ -34,24 +35,17 @@ std::string NumberText(double value) {
 }
 
 std::optional<double> ParseDouble(std::string_view text) {
-  double value;
-  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
-  if (text.empty() || error != std::errc() || end != text.data() + text.size() || !std::isfinite(value)) return std::nullopt;
+  std::optional<double> value = ParseNumber<double>(text);
+  if (value && !std::isfinite(*value)) return std::nullopt;
   return value;
 }
 
-std::optional<std::int32_t> ParseInt(std::string_view text) {
-  std::int32_t value;
-  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
-  if (text.empty() || error != std::errc() || end != text.data() + text.size()) return std::nullopt;
-  return value;
-}
+std::optional<std::int32_t> ParseInt(std::string_view text) { return ParseNumber<std::int32_t>(text); }
 
 std::optional<std::string> Canonical(ValueType type, std::string_view text) {
   switch (type) {
     case ValueType::Bool:
-      if (text == "true" || text == "1") return "true";
-      if (text == "false" || text == "0") return "false";
+      if (auto v = ParseBool(text)) return *v ? "true" : "false";
       return std::nullopt;
     case ValueType::Int:
       if (auto v = ParseInt(text)) return std::to_string(*v);

@@ -3,6 +3,7 @@
 
 #include <charconv>
 #include <cstdint>
+#include <type_traits>
 #include <vector>
 
 namespace client3::host {
@@ -46,18 +47,6 @@ std::vector<std::string> SplitList(std::string_view text) {
   return items;
 }
 
-template <class T>
-bool ParseNumber(std::string_view text, T& value) {
-  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
-  return error == std::errc() && end == text.data() + text.size() && !text.empty();
-}
-
-bool ParseBool(std::string_view text, bool& value) {
-  if (text == "true" || text == "1") return value = true, true;
-  if (text == "false" || text == "0") return value = false, true;
-  return false;
-}
-
 // One scalar of the given type read from the payload and appended as text.
 void AppendScalar(std::string& out, Reader& in, Type type) {
   switch (type) {
@@ -72,19 +61,31 @@ void AppendScalar(std::string& out, Reader& in, Type type) {
 }
 
 // One scalar parsed from text and written without its tag.
+template <class T>
+bool WriteParsed(std::optional<T> value, Writer& out) {
+  if (value) out.Raw(static_cast<std::conditional_t<std::is_same_v<T, bool>, std::uint8_t, T>>(*value));
+  return value.has_value();
+}
+
 bool WriteScalar(std::string_view text, Type type, Writer& out) {
   switch (type) {
-    case Type::Int: { std::int32_t v; return ParseNumber(text, v) && (out.Raw(v), true); }
-    case Type::UInt: { std::uint32_t v; return ParseNumber(text, v) && (out.Raw(v), true); }
-    case Type::ULong: { std::uint64_t v; return ParseNumber(text, v) && (out.Raw(v), true); }
-    case Type::Float: { float v; return ParseNumber(text, v) && (out.Raw(v), true); }
-    case Type::Double: { double v; return ParseNumber(text, v) && (out.Raw(v), true); }
-    case Type::Bool: { bool v; return ParseBool(text, v) && (out.Raw<std::uint8_t>(v), true); }
+    case Type::Int: return WriteParsed(ParseNumber<std::int32_t>(text), out);
+    case Type::UInt: return WriteParsed(ParseNumber<std::uint32_t>(text), out);
+    case Type::ULong: return WriteParsed(ParseNumber<std::uint64_t>(text), out);
+    case Type::Float: return WriteParsed(ParseNumber<float>(text), out);
+    case Type::Double: return WriteParsed(ParseNumber<double>(text), out);
+    case Type::Bool: return WriteParsed(ParseBool(text), out);
     default: out.RawText(text); return true;
   }
 }
 
 }  // namespace
+
+std::optional<bool> ParseBool(std::string_view text) {
+  if (text == "true" || text == "1") return true;
+  if (text == "false" || text == "0") return false;
+  return std::nullopt;
+}
 
 std::string ToText(Reader& in, Type type) {
   std::string out;

@@ -4,12 +4,26 @@
 // written behind a backslash.
 #pragma once
 
+#include <charconv>
+#include <optional>
 #include <string>
 #include <string_view>
 
 #include "protocol/wire.h"
 
 namespace client3::host {
+
+// A number that is the whole of `text`, or nothing.
+template <class T>
+std::optional<T> ParseNumber(std::string_view text) {
+  T value;
+  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
+  if (text.empty() || error != std::errc() || end != text.data() + text.size()) return std::nullopt;
+  return value;
+}
+
+// "true" or "1", "false" or "0".
+std::optional<bool> ParseBool(std::string_view text);
 
 // Reads the next value of type `type` and writes it as text.
 std::string ToText(protocol::Reader& in, protocol::Type type);
