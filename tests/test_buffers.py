@@ -25,12 +25,8 @@ NUMERIC = [
 
 
 @pytest.fixture(autouse=True)
-def client3_classes(registered_classes):
-    """Client3's classes for the test; the suite's own stand-in classes put back after it."""
-    Client3.register()
-    yield
-    for name, cls in registered_classes.items():
-        getattr(_Client3, name + "_swigregister")(cls)
+def client3_classes(companion_classes):
+    """Client3's classes for every test of this file."""
 
 
 @pytest.fixture
