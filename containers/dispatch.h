@@ -35,17 +35,44 @@ inline void ContainerErrors() {
 
 // ---- Overload dispatch ------------------------------------------------------------------------
 
-// Tests one argument for a kind without converting it and without leaving an error.
+// How a form's argument fared when the form was tried.
+enum class Tried { Refused, Selected, Loaded };
+
+// Tries one argument of a form: converted at once when it converts (the conversion is then the one
+// the call uses), or else tested with the kind's own check, if it has one. An argument that does not
+// convert but passes its check still selects the form; it reports its failure when the form is called.
+// A kind whose reading runs script code (a sequence of the script's own) is checked first and read
+// again by the call, as the form is chosen by the check. No error is left behind.
 template <class K>
-bool Accepts(PyObject* o) {
-  if constexpr (requires { K::check(o); }) {
-    return K::check(o);
-  } else {
-    K kind;
-    int code = kind.load(o);
-    if (code == Raised) PyErr_Clear();
-    return code >= 0;
+Tried Try(K& kind, PyObject* o) {
+  if constexpr (requires { K::checkFirst(o); }) {
+    if (K::checkFirst(o)) return K::check(o) ? Tried::Selected : Tried::Refused;
   }
+  if (kind.load(o) >= 0) return Tried::Loaded;
+  PyErr_Clear();
+  if constexpr (requires { K::check(o); }) {
+    if (K::check(o)) return Tried::Selected;
+  }
+  return Tried::Refused;
+}
+
+// Kinds tested by their exact type are tried before the others, so that a form they rule out converts
+// nothing.
+template <class K>
+inline constexpr bool TypeTested = requires { K::typeTested; };
+
+// Reports an argument of the chosen form: one that did not convert is converted again for its message;
+// a null reference is refused.
+template <Text Name, unsigned N, class K>
+bool Report(K& kind, PyObject* o, Tried tried) {
+  if (tried != Tried::Loaded) return Load<Name, N>(kind, o);
+  if constexpr (K::reference) {
+    if (kind.null()) {
+      RaiseNullRef(NullRefText<Name, N, K::type>());
+      return false;
+    }
+  }
+  return true;
 }
 
 // One form of an overloaded function: its argument kinds and its target.
@@ -53,14 +80,26 @@ template <auto Target, class... K>
 struct Form {
   static constexpr std::size_t arity = sizeof...(K);
 
-  static bool accepts(PyObject** objects) { return accepts(objects, std::index_sequence_for<K...>{}); }
-  template <std::size_t... I>
-  static bool accepts(PyObject** objects, std::index_sequence<I...>) {
-    return (Accepts<K>(objects[I]) && ...);
-  }
+  // Calls the form when its arguments fit it, each argument converted once; false when they do not.
   template <Text Name>
-  static PyObject* call(PyObject** objects) {
-    return Invoke<Name, Target, K...>(objects, std::index_sequence_for<K...>{});
+  static bool attempt(PyObject** objects, PyObject*& result) {
+    return attempt<Name>(objects, result, std::index_sequence_for<K...>{});
+  }
+  template <Text Name, std::size_t... I>
+  static bool attempt(PyObject** objects, PyObject*& result, std::index_sequence<I...>) {
+    std::tuple<K...> kinds;
+    Tried tried[arity ? arity : 1];
+    [[maybe_unused]] auto fits = [&](auto index) {
+      constexpr std::size_t J = decltype(index)::value;
+      tried[J] = Try(std::get<J>(kinds), objects[J]);
+      return tried[J] != Tried::Refused;
+    };
+    if (!((!TypeTested<K> || fits(std::integral_constant<std::size_t, I>{})) && ...)) return false;
+    if (!((TypeTested<K> || fits(std::integral_constant<std::size_t, I>{})) && ...)) return false;
+    result = (Report<Name, I + 1>(std::get<I>(kinds), objects[I], tried[I]) && ...)
+                 ? CallGuarded<Target, UnexpectedErrors>(std::get<I>(kinds).get()...)
+                 : nullptr;
+    return true;
   }
 };
 
@@ -75,9 +114,7 @@ PyObject* Dispatch(PyObject*, PyObject* args) {
   if (Py_ssize_t found = UnpackTuple(args, Name.chars, 0, most, objects)) {
     std::size_t count = static_cast<std::size_t>(found - 1);
     PyObject* result = nullptr;
-    bool chosen = ((Forms::arity == count && Forms::accepts(objects) &&
-                    (result = Forms::template call<Name>(objects), true)) ||
-                   ...);
+    bool chosen = ((Forms::arity == count && Forms::template attempt<Name>(objects, result)) || ...);
     if (chosen) return result;
   }
   if constexpr (Otherwise == NoMatch::NotImplemented) {

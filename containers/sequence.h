@@ -146,7 +146,7 @@ int AsVector(PyObject* o, std::vector<T>** out) {
   if (!listOrTuple && (o == Py_None || GetThisProxy(o))) {
     TypeInfo* type = SequenceDescriptor<T>();
     void* pointer = nullptr;
-    if (!type || ConvertPtr(o, &pointer, type, 0) < 0) return ResultError;
+    if (!type || ConvertProxy(o, &pointer, type, 0) < 0) return ResultError;
     if (out) *out = static_cast<std::vector<T>*>(pointer);
     return ResultOk;
   }
@@ -189,6 +189,14 @@ struct SequenceArg {
   const std::vector<T>& get() const { return *value; }
   bool null() const { return !value; }
   static bool check(PyObject* o) { return AsVector<T>(o, nullptr) >= 0; }
+  // Lists and tuples read the same in both modes; other sequences run script code when read.
+  static bool checkFirst(PyObject* o) { return !PyList_CheckExact(o) && !PyTuple_CheckExact(o); }
+};
+
+// A whole vector taken by value: a vector made for the call is handed over rather than copied.
+template <class T, Text Type>
+struct SequenceValue : SequenceArg<T, Type> {
+  std::vector<T> get() { return this->made ? std::move(*this->value) : *this->value; }
 };
 
 }  // namespace client3

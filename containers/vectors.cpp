@@ -95,6 +95,7 @@ using ValueArg = std::conditional_t<std::is_same_v<T, SafeString>, TextElement<T
 struct SliceArg {
   static constexpr Text type = "PySliceObject *";
   static constexpr bool reference = false;
+  static constexpr bool typeTested = true;
   PyObject* value = nullptr;
   int load(PyObject* o) {
     if (Py_TYPE(o) != &PySlice_Type) {
@@ -118,7 +119,7 @@ struct PositionArg {
   typename V::iterator value{};
   int load(PyObject* o) {
     void* pointer = nullptr;
-    if (ConvertPtr(o, &pointer, TypeFor<swig::SwigPyIterator>(), 0) < 0 || !pointer) return ErrTypeError;
+    if (ConvertProxy(o, &pointer, TypeFor<swig::SwigPyIterator>(), 0) < 0 || !pointer) return ErrTypeError;
     auto* at = dynamic_cast<swig::SwigPyIterator_T<typename V::iterator>*>(static_cast<swig::SwigPyIterator*>(pointer));
     if (!at) return ErrTypeError;
     value = at->get_current();
@@ -126,7 +127,7 @@ struct PositionArg {
   }
   static bool check(PyObject* o) {
     void* pointer = nullptr;
-    return ConvertPtr(o, &pointer, TypeFor<swig::SwigPyIterator>(), 0) >= 0 && pointer;
+    return ConvertProxy(o, &pointer, TypeFor<swig::SwigPyIterator>(), 0) >= 0 && pointer;
   }
   typename V::iterator get() const { return value; }
 };
@@ -170,7 +171,7 @@ struct Vector {
   // encoding error pending) without naming any type. Nothing sets it apart from the others.
   using Value = ValueArg<T, ElementType>;
   using Seq = SequenceArg<T>;
-  using Copied = SequenceArg<T, Original>;
+  using Copied = SequenceValue<T, Original>;
   using Ref = Pointer<V, cat(C, " &")>;
   using Pos = PositionArg<V, IteratorType>;
 
@@ -276,7 +277,7 @@ struct Vector {
     return OpenAt(v, v->erase(first, last));
   };
   static constexpr auto make = [] { return Owned<V, PointerOwn | PointerNoShadow>{new V()}; };
-  static constexpr auto copy = [](const V& s) { return Owned<V, PointerOwn | PointerNoShadow>{new V(s)}; };
+  static constexpr auto copy = [](V s) { return Owned<V, PointerOwn | PointerNoShadow>{new V(std::move(s))}; };
   static constexpr auto sized = [](unsigned int n) { return Owned<V, PointerOwn | PointerNoShadow>{new V(Room(n))}; };
   static constexpr auto filled = [](unsigned int n, const T& x) {
     return Owned<V, PointerOwn | PointerNoShadow>{new V(Room(n), x)};

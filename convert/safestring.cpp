@@ -2,6 +2,7 @@
 #include <cstring>
 #include <string>
 #include <unordered_set>
+#include <utility>
 
 #include "convert/scalar.h"
 #include "convert/text.h"
@@ -118,8 +119,23 @@ PyObject* NewSafeString(PyObject*, PyObject* args) {
 
 constexpr auto IsEmpty = [](const SafeString* s) { return !s->Text() || !*s->Text(); };
 constexpr auto Value = [](const SafeString* s) { return SafeStringText(*s); };
+// The messages are the library's constant texts: each is made into a str once and then shared.
 constexpr auto Message = [](ZarvoSDKClientCPP::ResultCode::Enum code) {
   const char* message = ZarvoSDKClientCPP::ResultText(code);
+  static std::pair<const char*, PyObject*> made[16];
+  for (auto& [text, object] : made) {
+    if (text == message) {
+      Py_INCREF(object);
+      return object;
+    }
+    if (!text) {
+      object = TextToPython(message, std::strlen(message));
+      if (!object) return object;
+      text = message;
+      Py_INCREF(object);
+      return object;
+    }
+  }
   return TextToPython(message, std::strlen(message));
 };
 

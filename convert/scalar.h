@@ -40,7 +40,16 @@ inline int AsUnsignedInt(PyObject* o, unsigned int* out) {
 
 inline int AsUnsignedLongLong(PyObject* o, unsigned long long* out) {
   if (!IsInt(o)) return ErrTypeError;
-  unsigned long long v = PyLong_AsUnsignedLongLong(o);
+  // Most values fit a signed 64-bit integer, whose conversion is the interpreter's quick one.
+  int beyond = 0;
+  long long small = PyLong_AsLongLongAndOverflow(o, &beyond);
+  unsigned long long v = static_cast<unsigned long long>(small);
+  if (beyond > 0) {
+    v = PyLong_AsUnsignedLongLong(o);
+  } else if (beyond < 0 || small < 0) {
+    PyErr_Clear();
+    return ErrOverflowError;
+  }
   if (PyErr_Occurred()) {
     PyErr_Clear();
     return ErrOverflowError;
@@ -51,15 +60,13 @@ inline int AsUnsignedLongLong(PyObject* o, unsigned long long* out) {
 
 inline int AsBool(PyObject* o, bool* out) {
   if (Py_TYPE(o) != &PyBool_Type) return ErrTypeError;
-  int truth = PyObject_IsTrue(o);
-  if (truth == -1) return ErrTypeError;
-  if (out) *out = truth > 0;
+  if (out) *out = o == Py_True;
   return ResultOk;
 }
 
 inline int AsDouble(PyObject* o, double* out) {
   if (Py_TYPE(o) == &PyFloat_Type || PyType_IsSubtype(Py_TYPE(o), &PyFloat_Type)) {
-    if (out) *out = PyFloat_AsDouble(o);
+    if (out) *out = PyFloat_AS_DOUBLE(o);
     return ResultOk;
   }
   if (!IsInt(o)) return ErrTypeError;

@@ -189,6 +189,8 @@ constexpr PyTypeObject kEmptyType = {PyVarObject_HEAD_INIT(nullptr, 0)};
 
 }  // namespace
 
+PyTypeObject* proxyType = nullptr;
+
 PyTypeObject* SwigPyObject_type() {
   static PyTypeObject* type = [] {
     static PyNumberMethods number{};
@@ -204,7 +206,7 @@ PyTypeObject* SwigPyObject_type() {
     t.tp_doc = kProxyDoc;
     t.tp_richcompare = ProxyCompare;
     t.tp_methods = proxyMethods;
-    return PyType_Ready(&t) == 0 ? &t : nullptr;
+    return proxyType = PyType_Ready(&t) == 0 ? &t : nullptr;
   }();
   return type;
 }

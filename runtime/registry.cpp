@@ -203,7 +203,7 @@ TypeInfo* TypeQuery(const char* name) {
 CastInfo* TypeCheck(const char* name, TypeInfo* target) {
   if (!target) return nullptr;
   for (CastInfo* cast = target->casts; cast; cast = cast->next) {
-    if (std::strcmp(cast->type->mangledName, name) != 0) continue;
+    if (cast->type->mangledName != name && std::strcmp(cast->type->mangledName, name) != 0) continue;
     if (cast != target->casts) {
       cast->prev->next = cast->next;
       if (cast->next) cast->next->prev = cast->prev;
@@ -228,6 +228,10 @@ SwigPyObject* GetThisProxy(PyObject* object) {
   // A chain of "this" attributes that does not end in a proxy within this many steps is taken to
   // loop back on itself (an object whose "this" is itself, say) and holds no proxy.
   constexpr int kLongestChain = 64;
+  // Numbers, texts and None are built-in objects that can carry no attribute of their own.
+  if (object && (PyLong_CheckExact(object) || PyFloat_CheckExact(object) || PyUnicode_CheckExact(object) ||
+                 PyBool_Check(object) || PyBytes_CheckExact(object) || object == Py_None))
+    return nullptr;
   for (int depth = 0; object && depth < kLongestChain; ++depth) {
     if (SwigPyObject_Check(object)) return reinterpret_cast<SwigPyObject*>(object);
     PyObject* next = PyObject_GetAttr(object, ThisName());

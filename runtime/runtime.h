@@ -76,6 +76,8 @@ struct SwigPyPacked {
 };
 
 PyTypeObject* SwigPyObject_type();
+// The proxy type of this copy of the runtime once it is ready; null before.
+extern PyTypeObject* proxyType;
 PyTypeObject* SwigPyPacked_type();
 bool SwigPyObject_Check(PyObject* op);
 bool SwigPyPacked_Check(PyObject* op);
@@ -135,6 +137,18 @@ CastInfo* TypeCheck(const char* name, TypeInfo* target);
 const char* PrettyTypeName(const TypeInfo* type);
 SwigPyObject* GetThisProxy(PyObject* object);
 int ConvertPtr(PyObject* object, void** out, TypeInfo* target, int flags, int* own = nullptr);
+// ConvertPtr with its common case inline: a bare proxy of this runtime that holds the target type.
+inline int ConvertProxy(PyObject* object, void** out, TypeInfo* target, int flags) {
+  if (object && target && Py_TYPE(object) == proxyType) {
+    auto* proxy = reinterpret_cast<SwigPyObject*>(object);
+    if (proxy->type == target) {
+      *out = proxy->ptr;
+      if (flags & PointerDisown) proxy->own = 0;
+      return ResultOk;
+    }
+  }
+  return ConvertPtr(object, out, target, flags);
+}
 PyObject* NewPointerObj(PyObject* self, void* ptr, TypeInfo* type, int flags);
 ClientData* NewClientData(PyObject* proxyClass);
 void SetTypeClientData(TypeInfo* type, ClientData* data);

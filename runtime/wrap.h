@@ -100,7 +100,7 @@ struct Pointer {
   T* value = nullptr;
   int load(PyObject* o) {
     void* pointer = nullptr;
-    int code = ConvertPtr(o, &pointer, TypeFor<std::remove_const_t<T>>(), Flags);
+    int code = ConvertProxy(o, &pointer, TypeFor<std::remove_const_t<T>>(), Flags);
     value = static_cast<T*>(pointer);
     return code;
   }
@@ -214,7 +214,11 @@ PyObject* Wrap(PyObject*, PyObject* args) {
     objects[0] = args;
   } else {
     static_assert(Conv == Tuple || count == 0, "a no-argument function takes none");
-    if (!UnpackTuple(args, Name.chars, count, count, objects)) return nullptr;
+    if (Conv == Tuple && args && PyTuple_CheckExact(args) && PyTuple_GET_SIZE(args) == count) {
+      for (Py_ssize_t i = 0; i < count; ++i) objects[i] = PyTuple_GET_ITEM(args, i);
+    } else if (!UnpackTuple(args, Name.chars, count, count, objects)) {
+      return nullptr;
+    }
   }
   return Invoke<Name, Target, K...>(objects, std::index_sequence_for<K...>{});
 }
