@@ -10,6 +10,7 @@ Calls are measured on bare proxies (the companion's classes are not registered);
 out owned are deleted in the same statement, and the floor calls a do-nothing function in their place.
 """
 import argparse
+import ctypes
 import os
 import platform
 import re
@@ -76,34 +77,46 @@ def measure(rows, repeats):
             row.run_once()
 
 
-def import_self_time(module, path, runs):
-    """Best self time (microseconds) of `import module` in a fresh interpreter, from -X importtime."""
-    best = float("inf")
+def import_self_times(modules, path, runs):
+    """Best self time (microseconds) of `import module` in a fresh interpreter, from -X importtime, for
+    each module; the modules take turns."""
+    best = dict.fromkeys(modules, float("inf"))
     env = dict(os.environ, PYTHONPATH=os.pathsep.join([path, os.environ.get("PYTHONPATH", "")]))
     for _ in range(runs):
-        done = subprocess.run([sys.executable, "-X", "importtime", "-c", "import " + module],
-                              capture_output=True, text=True, env=env)
-        for line in done.stderr.splitlines():
-            found = re.match(r"import time:\s+(\d+) \|\s+\d+ \|\s+%s$" % re.escape(module), line)
-            if found:
-                best = min(best, int(found.group(1)))
-    return best
+        for module in modules:
+            done = subprocess.run([sys.executable, "-X", "importtime", "-c", "import " + module],
+                                  capture_output=True, text=True, env=env)
+            for line in done.stderr.splitlines():
+                found = re.match(r"import time:\s+(\d+) \|\s+\d+ \|\s+%s$" % re.escape(module), line)
+                if found:
+                    best[module] = min(best[module], int(found.group(1)))
+    return [best[module] for module in modules]
+
+
+def native_heap():
+    """A function giving the bytes of the C heap in use (the GNU C library's count), or None."""
+    try:
+        libc = ctypes.CDLL(None)
+        mallinfo2 = libc.mallinfo2
+    except (OSError, AttributeError):
+        return None
+
+    class MallInfo2(ctypes.Structure):
+        _fields_ = [(name, ctypes.c_size_t) for name in ("arena", "ordblks", "smblks", "hblks", "hblkhd", "usmblks",
+                                                         "fsmblks", "uordblks", "fordblks", "keepcost")]
+
+    mallinfo2.restype = MallInfo2
+    return lambda: mallinfo2().uordblks + mallinfo2().hblkhd
 
 
 def memory_per_element(make, count):
-    """Bytes of resident memory per element that `make()` adds (Linux only; None elsewhere)."""
-    statm = "/proc/self/statm"
-    if not os.path.exists(statm):
+    """Bytes of C heap per element that `make()` keeps (the proxy object is the interpreter's), or None."""
+    in_use = native_heap()
+    if in_use is None:
         return None
-
-    def resident():
-        with open(statm) as f:
-            return int(f.read().split()[1]) * os.sysconf("SC_PAGE_SIZE")
-
-    before = resident()
+    before = in_use()
     made = make()
-    grown = resident() - before
-    return made, grown / count
+    return made, (in_use() - before) / count
 
 
 # ---- The shapes ---------------------------------------------------------------------------------
@@ -297,8 +310,7 @@ def main(argv=None):
                     [(row.shape, *row.cells()) for row in converted])
 
         runs = 3 if options.quick else 15
-        ours = import_self_time("_Client3", directory, runs)
-        empty = import_self_time("_c3floor_empty", directory, runs)
+        ours, empty = import_self_times(["_Client3", "_c3floor_empty"], directory, runs)
         lines = [("import (self time)", "%d us" % ours, "%d us" % empty, "%.2f" % (ours / empty))]
         lines += memory_rows(m, size)
         trip = round_trip_row(m, 200 if options.quick else 5000)

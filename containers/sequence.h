@@ -6,6 +6,7 @@
 #include <cstdio>
 #include <memory>
 #include <stdexcept>
+#include <type_traits>
 #include <vector>
 
 #include "convert/scalar.h"
@@ -88,15 +89,20 @@ struct ItemRef {
 };
 
 // Lists and tuples: their items are read in place. Converting an element runs no script code, so
-// the sequence cannot change under the loop; its length is still read before every element.
+// the sequence cannot change under the loop. A number that does not convert is converted again by
+// SequenceElement, which reports it.
 template <class T>
 void FillFromListOrTuple(PyObject* o, std::vector<T>& out) {
-  if (PyList_CheckExact(o)) {
-    out.reserve(PyList_GET_SIZE(o));
-    for (Py_ssize_t i = 0; i < PyList_GET_SIZE(o); ++i) out.push_back(SequenceElement<T>(PyList_GET_ITEM(o, i), i));
-  } else {
-    out.reserve(PyTuple_GET_SIZE(o));
-    for (Py_ssize_t i = 0; i < PyTuple_GET_SIZE(o); ++i) out.push_back(SequenceElement<T>(PyTuple_GET_ITEM(o, i), i));
+  PyObject** items = PySequence_Fast_ITEMS(o);
+  Py_ssize_t size = PySequence_Fast_GET_SIZE(o);
+  out.reserve(static_cast<std::size_t>(size));
+  for (Py_ssize_t i = 0; i < size; ++i) {
+    if constexpr (std::is_arithmetic_v<T>) {
+      T value;
+      out.push_back(ElementTraits<T>::convert(items[i], &value) >= 0 ? value : SequenceElement<T>(items[i], i));
+    } else {
+      out.push_back(SequenceElement<T>(items[i], i));
+    }
   }
 }
 
