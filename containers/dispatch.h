@@ -38,6 +38,11 @@ inline void ContainerErrors() {
 // How a form's argument fared when the form was tried.
 enum class Tried { Refused, Selected, Loaded };
 
+// Kinds tested by their exact type are tested before they are converted, and before the other kinds,
+// so that a form they rule out converts nothing.
+template <class K>
+inline constexpr bool TypeTested = requires { K::typeTested; };
+
 // Tries one argument of a form: converted at once when it converts (the conversion is then the one
 // the call uses), or else tested with the kind's own check, if it has one. An argument that does not
 // convert but passes its check still selects the form; it reports its failure when the form is called.
@@ -48,6 +53,9 @@ Tried Try(K& kind, PyObject* o) {
   if constexpr (requires { K::checkFirst(o); }) {
     if (K::checkFirst(o)) return K::check(o) ? Tried::Selected : Tried::Refused;
   }
+  if constexpr (TypeTested<K>) {
+    if (!K::check(o)) return Tried::Refused;
+  }
   if (kind.load(o) >= 0) return Tried::Loaded;
   PyErr_Clear();
   if constexpr (requires { K::check(o); }) {
@@ -55,11 +63,6 @@ Tried Try(K& kind, PyObject* o) {
   }
   return Tried::Refused;
 }
-
-// Kinds tested by their exact type are tried before the others, so that a form they rule out converts
-// nothing.
-template <class K>
-inline constexpr bool TypeTested = requires { K::typeTested; };
 
 // Reports an argument of the chosen form: one that did not convert is converted again for its message;
 // a null reference is refused.

@@ -95,6 +95,16 @@ template <class T>
 void FillFromListOrTuple(PyObject* o, std::vector<T>& out) {
   PyObject** items = PySequence_Fast_ITEMS(o);
   Py_ssize_t size = PySequence_Fast_GET_SIZE(o);
+  if constexpr (std::is_same_v<T, bool>) {
+    // Packed bits: setting the true ones in a cleared vector is quicker than appending bit by bit.
+    out.resize(static_cast<std::size_t>(size));
+    for (Py_ssize_t i = 0; i < size; ++i) {
+      bool value;
+      if (ElementTraits<T>::convert(items[i], &value) < 0) value = SequenceElement<T>(items[i], i);
+      if (value) out[static_cast<std::size_t>(i)] = true;
+    }
+    return;
+  }
   out.reserve(static_cast<std::size_t>(size));
   for (Py_ssize_t i = 0; i < size; ++i) {
     if constexpr (std::is_arithmetic_v<T>) {

@@ -40,16 +40,7 @@ inline int AsUnsignedInt(PyObject* o, unsigned int* out) {
 
 inline int AsUnsignedLongLong(PyObject* o, unsigned long long* out) {
   if (!IsInt(o)) return ErrTypeError;
-  // Most values fit a signed 64-bit integer, whose conversion is the interpreter's quick one.
-  int beyond = 0;
-  long long small = PyLong_AsLongLongAndOverflow(o, &beyond);
-  unsigned long long v = static_cast<unsigned long long>(small);
-  if (beyond > 0) {
-    v = PyLong_AsUnsignedLongLong(o);
-  } else if (beyond < 0 || small < 0) {
-    PyErr_Clear();
-    return ErrOverflowError;
-  }
+  unsigned long long v = PyLong_AsUnsignedLongLong(o);
   if (PyErr_Occurred()) {
     PyErr_Clear();
     return ErrOverflowError;

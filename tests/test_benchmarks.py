@@ -1,5 +1,6 @@
 """The benchmarks keep working: each runs once in its quick form. Their figures are not checked."""
 import os
+import platform
 import subprocess
 import sys
 
@@ -29,3 +30,29 @@ def test_bench_buffers_quick_prints_its_table():
                 "GetTrajectory + element by element"):
         assert any(line.startswith(row) and len(line.split()) == len(row.split()) + 2 for line in lines), (row, done.stdout)
     assert sum(line.startswith("goal: ") for line in lines) == 1, done.stdout
+
+
+def test_suite_quick_prints_every_row_against_its_floor():
+    done = subprocess.run([sys.executable, os.path.join(BENCHMARKS, "suite.py"), "--quick"],
+                          capture_output=True, text=True, timeout=600)
+    assert done.returncode == 0, done.stderr
+    rows = {}
+    for line in done.stdout.splitlines():
+        cells = [cell.strip() for cell in line.strip("|").split("|")]
+        if line.startswith("| ") and len(cells) == 4:
+            rows[cells[0]] = cells[1:]
+    assert any(line.startswith("machine: ") for line in done.stdout.splitlines()), done.stdout
+    assert any(line.startswith("interpreter: ") for line in done.stdout.splitlines()), done.stdout
+    with_floor = ["int field get (one object)", "string field get", "vector field get", "SafeString_Value",
+                  "ToString(1003)", "vectord___len__", "client call, unconnected (GetFrameCount)",
+                  "int field set (tuple of 2)", "vectord_assign (tuple of 3)", "client call, tuple of 8 (ChannelSetValue)",
+                  "vectord___getitem__(v, 3) (overloaded, by type)", "SwigPyIterator_incr + decr (overloaded, tuple of 1)",
+                  "iteration, per element (SwigPyIterator___next__)", "list of floats -> vectord",
+                  "tuple of floats -> vectord", "list of bools -> vectorb", "import (self time)"]
+    if platform.libc_ver()[0] == "glibc":  # the C heap is measured through the GNU C library
+        with_floor.append("memory per element, vectord")
+    for shape in with_floor:
+        ours, floor, ratio = rows[shape]
+        assert ours[0].isdigit() and floor[0].isdigit() and float(ratio) > 0, (shape, rows[shape])
+    ours, floor, ratio = rows["round trip to the host (GetFrameCount)"]
+    assert ours[0].isdigit() and floor == ratio == "-", rows
