@@ -11,7 +11,7 @@
 
 #ifdef FLOOR_EMPTY
 
-static struct PyModuleDef empty = {PyModuleDef_HEAD_INIT, "_c3floor_empty", NULL, -1, NULL};
+static struct PyModuleDef empty = {PyModuleDef_HEAD_INIT, "_c3floor_empty", NULL, -1, NULL, NULL, NULL, NULL, NULL};
 PyMODINIT_FUNC PyInit__c3floor_empty(void) { return PyModule_Create(&empty); }
 
 #else
@@ -135,7 +135,7 @@ static PyMethodDef methods[] = {
     {NULL, NULL, 0, NULL},
 };
 
-static struct PyModuleDef floor_module = {PyModuleDef_HEAD_INIT, "_c3floor", NULL, -1, methods};
+static struct PyModuleDef floor_module = {PyModuleDef_HEAD_INIT, "_c3floor", NULL, -1, methods, NULL, NULL, NULL, NULL};
 PyMODINIT_FUNC PyInit__c3floor(void) { return PyModule_Create(&floor_module); }
 
 #endif

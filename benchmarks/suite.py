@@ -98,7 +98,7 @@ def native_heap():
     try:
         libc = ctypes.CDLL(None)
         mallinfo2 = libc.mallinfo2
-    except (OSError, AttributeError):
+    except (OSError, AttributeError, TypeError):  # no C library to open, or not the GNU one
         return None
 
     class MallInfo2(ctypes.Structure):
