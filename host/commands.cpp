@@ -389,21 +389,24 @@ void Handle<Id::SetTrajectoryAtFrame>(Context& context, Reader& in, Writer&) {
 }
 
 #define CLIENT3_ENTRY(name) {Id::name, &Handle<Id::name>}
+#define CLIENT3_READ(name) {Id::name, &Handle<Id::name>, Access::Read}
 constexpr HandlerEntry kSceneHandlers[] = {
-    CLIENT3_ENTRY(GetServerInfo),       CLIENT3_ENTRY(GetCommandList),       CLIENT3_ENTRY(GetCommandInfo),
-    CLIENT3_ENTRY(ProcessRequest),      CLIENT3_ENTRY(GetFrameCount),        CLIENT3_ENTRY(SetLanguage),
-    CLIENT3_ENTRY(PSL),                 CLIENT3_ENTRY(Log),                  CLIENT3_ENTRY(GetSceneName),
-    CLIENT3_ENTRY(SetSceneName),        CLIENT3_ENTRY(GetSubjectNames),      CLIENT3_ENTRY(GetMarkerNames),
-    CLIENT3_ENTRY(GetBoneNames),        CLIENT3_ENTRY(GetRootBone),          CLIENT3_ENTRY(GetBoneDetails),
-    CLIENT3_ENTRY(GetConstraintNames),  CLIENT3_ENTRY(GetConstraintDetails), CLIENT3_ENTRY(GetSubjectParamNames),
-    CLIENT3_ENTRY(GetSubjectParamDetails), CLIENT3_ENTRY(GetTrajectory),     CLIENT3_ENTRY(SetTrajectory),
-    CLIENT3_ENTRY(GetTrajectoryAtFrame), CLIENT3_ENTRY(SetTrajectoryAtFrame),
+    CLIENT3_READ(GetServerInfo),        CLIENT3_READ(GetCommandList),        CLIENT3_READ(GetCommandInfo),
+    CLIENT3_ENTRY(ProcessRequest),      CLIENT3_READ(GetFrameCount),         CLIENT3_ENTRY(SetLanguage),
+    CLIENT3_ENTRY(PSL),                 CLIENT3_READ(Log),                   CLIENT3_READ(GetSceneName),
+    CLIENT3_ENTRY(SetSceneName),        CLIENT3_READ(GetSubjectNames),       CLIENT3_READ(GetMarkerNames),
+    CLIENT3_READ(GetBoneNames),         CLIENT3_READ(GetRootBone),           CLIENT3_READ(GetBoneDetails),
+    CLIENT3_READ(GetConstraintNames),   CLIENT3_READ(GetConstraintDetails),  CLIENT3_READ(GetSubjectParamNames),
+    CLIENT3_READ(GetSubjectParamDetails), CLIENT3_READ(GetTrajectory),       CLIENT3_ENTRY(SetTrajectory),
+    CLIENT3_READ(GetTrajectoryAtFrame), CLIENT3_ENTRY(SetTrajectoryAtFrame),
 };
+#undef CLIENT3_READ
 #undef CLIENT3_ENTRY
 
 // One handler per command number, from every group's table.
 struct Dispatch {
   Handler handlers[protocol::kCommandCount] = {};
+  Access access[protocol::kCommandCount] = {};
   Dispatch() {
     for (auto group : {SceneHandlers(), ObjectHandlers(), FileHandlers(), TimelineHandlers(), SettingsHandlers(), FilterHandlers(),
                        ProcessingHandlers(), InterchangeHandlers(), WorkspaceHandlers()})
@@ -414,6 +417,7 @@ struct Dispatch {
           std::abort();
         }
         slot = entry.handler;
+        access[static_cast<std::size_t>(entry.id)] = entry.access;
       }
   }
 };
@@ -449,9 +453,18 @@ void ApplyMode(std::vector<bool>& selected, const std::vector<bool>& chosen, Sel
   }
 }
 
-void Run(Id id, Context& context, Reader& in, Writer& out) {
+static const Dispatch& Dispatched() {
   static const Dispatch dispatch;
-  Handler handler = dispatch.handlers[static_cast<std::size_t>(id)];
+  return dispatch;
+}
+
+Access AccessOf(Id id) {
+  Handler handler = Dispatched().handlers[static_cast<std::size_t>(id)];
+  return handler ? Dispatched().access[static_cast<std::size_t>(id)] : Access::Read;
+}
+
+void Run(Id id, Context& context, Reader& in, Writer& out) {
+  Handler handler = Dispatched().handlers[static_cast<std::size_t>(id)];
   if (!handler) Refuse("'" + std::string(CommandOf(id).name) + "' is not available in this version of the application");
   handler(context, in, out);
 }

@@ -13,6 +13,7 @@ using Handler = void (*)(Context&, protocol::Reader&, protocol::Writer&);
 struct HandlerEntry {
   protocol::Id id;
   Handler handler;
+  Access access = Access::Write;
 };
 
 std::span<const HandlerEntry> SceneHandlers();     // connection, protocol, subjects (commands.cpp)

@@ -39,6 +39,7 @@ bool ParseFault(std::string_view fault, Options& options) {
   int number = 0;
   if (!value.empty() && !ParseInt(value, number, -2147483647, 2147483647)) return false;
   if (kind == "frames") return number >= 0 && (options.faults.framesPerFrame = number, true);
+  if (kind == "stage-delay") return number >= 0 && (options.faults.stageDelay = number, true);
   static const std::pair<std::string_view, ReplyFault::Kind> kinds[] = {
       {"delay", ReplyFault::Delay}, {"garbage", ReplyFault::Garbage}, {"close", ReplyFault::Close},
       {"text", ReplyFault::Text},   {"status", ReplyFault::Status},   {"oversize", ReplyFault::Oversize}};

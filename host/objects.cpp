@@ -543,26 +543,28 @@ void ParameterRemove(Context& context, Reader& in, Writer&) {
 }
 
 #define CLIENT3_ENTRY(name) {Id::name, &name}
+#define CLIENT3_READ(name) {Id::name, &name, Access::Read}
 constexpr HandlerEntry kHandlers[] = {
-    CLIENT3_ENTRY(SceneGetObject), CLIENT3_ENTRY(SceneGetObjectList), CLIENT3_ENTRY(SceneCreateObject),
+    CLIENT3_READ(SceneGetObject), CLIENT3_READ(SceneGetObjectList), CLIENT3_ENTRY(SceneCreateObject),
     CLIENT3_ENTRY(SceneRemoveObject), CLIENT3_ENTRY(SceneSelectObject), CLIENT3_ENTRY(SceneSelectAllObjects),
-    CLIENT3_ENTRY(SceneSelectObjectsOfType), CLIENT3_ENTRY(SceneInvertObjectSelection), CLIENT3_ENTRY(SceneGetSelectedObjects),
-    CLIENT3_ENTRY(SceneGetPrimarySelectedObject), CLIENT3_ENTRY(SceneGetActiveClip), CLIENT3_ENTRY(SceneSetActiveClip),
-    CLIENT3_ENTRY(ObjectGetAttribute), CLIENT3_ENTRY(ObjectGetAttributes), CLIENT3_ENTRY(ObjectHasAttribute),
-    CLIENT3_ENTRY(ObjectGetAttributeValue), CLIENT3_ENTRY(ObjectSetAttributeValue), CLIENT3_ENTRY(ObjectGetChannel),
-    CLIENT3_ENTRY(ObjectGetChannels), CLIENT3_ENTRY(ObjectHasChannel), CLIENT3_ENTRY(ObjectGetParameter),
-    CLIENT3_ENTRY(ObjectGetParameters), CLIENT3_ENTRY(ObjectHasParameter), CLIENT3_ENTRY(ObjectGetChildren),
-    CLIENT3_ENTRY(ObjectGetDescendants), CLIENT3_ENTRY(ObjectGetParent), CLIENT3_ENTRY(ObjectGetPath),
-    CLIENT3_ENTRY(ObjectSetParent), CLIENT3_ENTRY(ObjectGetType), CLIENT3_ENTRY(ObjectSelect),
-    CLIENT3_ENTRY(ObjectSetConstraint), CLIENT3_ENTRY(AttributeGetName), CLIENT3_ENTRY(AttributeGetValue),
-    CLIENT3_ENTRY(AttributeSetValue), CLIENT3_ENTRY(ChannelGetName), CLIENT3_ENTRY(ChannelGetValue),
-    CLIENT3_ENTRY(ChannelSetValue), CLIENT3_ENTRY(ChannelHasKey), CLIENT3_ENTRY(ChannelSelectKeys),
+    CLIENT3_ENTRY(SceneSelectObjectsOfType), CLIENT3_ENTRY(SceneInvertObjectSelection), CLIENT3_READ(SceneGetSelectedObjects),
+    CLIENT3_READ(SceneGetPrimarySelectedObject), CLIENT3_READ(SceneGetActiveClip), CLIENT3_ENTRY(SceneSetActiveClip),
+    CLIENT3_READ(ObjectGetAttribute), CLIENT3_READ(ObjectGetAttributes), CLIENT3_READ(ObjectHasAttribute),
+    CLIENT3_READ(ObjectGetAttributeValue), CLIENT3_ENTRY(ObjectSetAttributeValue), CLIENT3_READ(ObjectGetChannel),
+    CLIENT3_READ(ObjectGetChannels), CLIENT3_READ(ObjectHasChannel), CLIENT3_READ(ObjectGetParameter),
+    CLIENT3_READ(ObjectGetParameters), CLIENT3_READ(ObjectHasParameter), CLIENT3_READ(ObjectGetChildren),
+    CLIENT3_READ(ObjectGetDescendants), CLIENT3_READ(ObjectGetParent), CLIENT3_READ(ObjectGetPath),
+    CLIENT3_ENTRY(ObjectSetParent), CLIENT3_READ(ObjectGetType), CLIENT3_ENTRY(ObjectSelect),
+    CLIENT3_ENTRY(ObjectSetConstraint), CLIENT3_READ(AttributeGetName), CLIENT3_READ(AttributeGetValue),
+    CLIENT3_ENTRY(AttributeSetValue), CLIENT3_READ(ChannelGetName), CLIENT3_READ(ChannelGetValue),
+    CLIENT3_ENTRY(ChannelSetValue), CLIENT3_READ(ChannelHasKey), CLIENT3_ENTRY(ChannelSelectKeys),
     CLIENT3_ENTRY(ChannelDeleteKey), CLIENT3_ENTRY(ChannelDeleteAllKeys), CLIENT3_ENTRY(ChannelDeleteSelectedKeys),
     CLIENT3_ENTRY(ChannelSelectKeysFromRanges), CLIENT3_ENTRY(ChannelSelectAllKeys), CLIENT3_ENTRY(ChannelInvertKeySelection),
-    CLIENT3_ENTRY(ChannelGetDefaultValue), CLIENT3_ENTRY(ChannelSetDefaultValue), CLIENT3_ENTRY(ChannelGetGaps),
-    CLIENT3_ENTRY(ParameterGet), CLIENT3_ENTRY(ParameterSet), CLIENT3_ENTRY(ParameterCreate),
+    CLIENT3_READ(ChannelGetDefaultValue), CLIENT3_ENTRY(ChannelSetDefaultValue), CLIENT3_READ(ChannelGetGaps),
+    CLIENT3_READ(ParameterGet), CLIENT3_ENTRY(ParameterSet), CLIENT3_ENTRY(ParameterCreate),
     CLIENT3_ENTRY(ParameterRemove),
 };
+#undef CLIENT3_READ
 #undef CLIENT3_ENTRY
 
 }  // namespace

@@ -28,7 +28,8 @@ constexpr auto kHelloTime = std::chrono::seconds(10);
 
 struct Shared {
   Scene& scene;
-  std::mutex sceneLock;  // every command runs whole while it holds the scene
+  SceneLock sceneLock;          // held shared by reads and stages at work, alone by writes
+  std::mutex writeLock;         // held by every command but reads for its whole run: one writer at a time
   const Options& options;
 };
 
@@ -183,7 +184,14 @@ void ServeClient(Shared& shared, Client& client) {
         } catch (const DecodeError& error) {
           Refuse("the request for '" + std::string(CommandOf(id).name) + "' does not match the command: " + error.what());
         }
-        std::lock_guard<std::mutex> lock(shared.sceneLock);
+        Access access = AccessOf(id);
+        std::unique_lock<std::mutex> writing(shared.writeLock, std::defer_lock);
+        if (access != Access::Read) writing.lock();
+        std::shared_lock<SceneLock> reading(shared.sceneLock, std::defer_lock);
+        std::unique_lock<SceneLock> alone(shared.sceneLock, std::defer_lock);
+        if (access == Access::Write) alone.lock();
+        else reading.lock();
+        context.reading = access == Access::Stage ? &reading : nullptr;
         Run(id, context, in, reply);
         ok = true;
       } catch (const Failure& failure) {
@@ -218,7 +226,7 @@ int Serve(const Options& options, Scene& scene, const std::atomic<bool>& stop) {
   std::fflush(stdout);
   LogLine("info", "serving scene '" + scene.Name() + "' of " + std::to_string(scene.frames) + " frames");
 
-  Shared shared{scene, {}, options};
+  Shared shared{scene, {}, {}, options};
   std::list<Client> clients;
   while (!stop) {
     Socket socket = listener.Accept(std::chrono::milliseconds(100));

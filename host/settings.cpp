@@ -229,7 +229,7 @@ void Set(Context& context, Reader& in, Writer&) {
 }
 
 #define CLIENT3_SETTINGS(record)                                                   \
-  {Id::OfflineGet##record##Settings, &Get<Record::record>}, {Id::OfflineSet##record##Settings, &Set<Record::record>}
+  {Id::OfflineGet##record##Settings, &Get<Record::record>, Access::Read}, {Id::OfflineSet##record##Settings, &Set<Record::record>}
 constexpr HandlerEntry kHandlers[] = {
     CLIENT3_SETTINGS(CircleFit),        CLIENT3_SETTINGS(Reconstruct),     CLIENT3_SETTINGS(LabelROM),
     CLIENT3_SETTINGS(Labeling),         CLIENT3_SETTINGS(LabelingSubjectCalibration),

@@ -165,23 +165,23 @@ void TimelineGetSelectedRanges(Context& context, Reader&, Writer& out) {
 }
 
 constexpr HandlerEntry kHandlers[] = {
-    {Id::TimelineGetTicks, &TimelineGetTicks},
+    {Id::TimelineGetTicks, &TimelineGetTicks, Access::Read},
     {Id::TimelineSetTicks, &TimelineSetTicks},
-    {Id::TimelineGetSecs, &TimelineGetSecs},
+    {Id::TimelineGetSecs, &TimelineGetSecs, Access::Read},
     {Id::TimelineSetSecs, &TimelineSetSecs},
-    {Id::TimelineGetFrames, &TimelineGetFrames},
+    {Id::TimelineGetFrames, &TimelineGetFrames, Access::Read},
     {Id::TimelineSetFrames, &TimelineSetFrames},
-    {Id::TimelineGetPlayStart, &GetBound<PlayStart>},
+    {Id::TimelineGetPlayStart, &GetBound<PlayStart>, Access::Read},
     {Id::TimelineSetPlayStart, &SetBound<PlayStart>},
-    {Id::TimelineGetPlayEnd, &GetBound<PlayEnd>},
+    {Id::TimelineGetPlayEnd, &GetBound<PlayEnd>, Access::Read},
     {Id::TimelineSetPlayEnd, &SetBound<PlayEnd>},
-    {Id::TimelineGetAnimStart, &GetBound<AnimStart>},
+    {Id::TimelineGetAnimStart, &GetBound<AnimStart>, Access::Read},
     {Id::TimelineSetAnimStart, &SetBound<AnimStart>},
-    {Id::TimelineGetAnimEnd, &GetBound<AnimEnd>},
+    {Id::TimelineGetAnimEnd, &GetBound<AnimEnd>, Access::Read},
     {Id::TimelineSetAnimEnd, &SetBound<AnimEnd>},
-    {Id::TimelineGetTimeCodeStandard, &TimelineGetTimeCodeStandard},
+    {Id::TimelineGetTimeCodeStandard, &TimelineGetTimeCodeStandard, Access::Read},
     {Id::TimelineSetTimeCodeStandard, &TimelineSetTimeCodeStandard},
-    {Id::TimelineGetFrameRate, &TimelineGetFrameRate},
+    {Id::TimelineGetFrameRate, &TimelineGetFrameRate, Access::Read},
     {Id::TimelineSetFrameRate, &TimelineSetFrameRate},
     {Id::TimelinePlay, &TimelinePlay},
     {Id::TimelineStop, &TimelineStop},
@@ -189,7 +189,7 @@ constexpr HandlerEntry kHandlers[] = {
     {Id::TimelineSelectAll, &TimelineSelectAll},
     {Id::TimelineInvertSelection, &TimelineInvertSelection},
     {Id::TimelineSelectRangeFromKeys, &TimelineSelectRangeFromKeys},
-    {Id::TimelineGetSelectedRanges, &TimelineGetSelectedRanges},
+    {Id::TimelineGetSelectedRanges, &TimelineGetSelectedRanges, Access::Read},
 };
 
 }  // namespace
