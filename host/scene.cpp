@@ -72,8 +72,6 @@ std::optional<std::string> Canonical(ValueType type, std::string_view text) {
   return std::nullopt;
 }
 
-namespace {
-
 std::vector<double> VectorOf(const std::string& text) {
   std::vector<double> v;
   std::size_t from = 0;
@@ -84,8 +82,6 @@ std::vector<double> VectorOf(const std::string& text) {
   }
   return v;
 }
-
-}  // namespace
 
 // ---- Channels, objects ----------------------------------------------------------------------------
 
@@ -235,12 +231,7 @@ Object& Scene::Add(ObjectId parent, std::string type, std::string name) {
     attribute("Model", ValueType::String, true, o.name);
     attribute("Active", ValueType::Bool, true, "true");
   } else if (o.type == "Marker") {
-    for (const char* axis : {"X", "Y", "Z"}) {
-      Channel c;
-      c.id = NewId(), c.name = axis;
-      c.Resize(frames);
-      o.channels.push_back(std::move(c));
-    }
+    for (const char* axis : {"X", "Y", "Z"}) AddChannel(o, axis);
   } else if (o.type == "Bone" || o.type == "Null" || o.type == "Camera") {
     attribute("Translation", ValueType::Vector, true, "0,0,0");
     attribute("WorldTranslation", ValueType::Vector, false, "");
@@ -262,6 +253,13 @@ Object& Scene::Add(ObjectId parent, std::string type, std::string name) {
   ObjectId id = o.id;
   objects.at(parent).children.push_back(id);
   return objects.emplace(id, std::move(o)).first->second;
+}
+
+Channel& Scene::AddChannel(Object& object, std::string name) {
+  Channel c;
+  c.id = NewId(), c.name = std::move(name);
+  c.Resize(frames);
+  return object.channels.emplace_back(std::move(c));
 }
 
 void Scene::Remove(ObjectId id) {

@@ -41,6 +41,8 @@ std::optional<std::string> Canonical(ValueType type, std::string_view text);
 // A number in its shortest form that reads back exactly.
 std::string NumberText(double value);
 std::optional<double> ParseDouble(std::string_view text);
+// The three numbers of a Vector text; a part that is no number reads 0.
+std::vector<double> VectorOf(const std::string& text);
 std::optional<std::int32_t> ParseInt(std::string_view text);
 
 struct Attribute {
@@ -149,6 +151,8 @@ struct Scene {
   // Adds an object with the standard attributes and channels of its type; the caller has checked
   // the name and the parent.
   Object& Add(ObjectId parent, std::string type, std::string name);
+  // Adds a channel with no keys to an object; the caller has checked the name.
+  Channel& AddChannel(Object& object, std::string name);
   // Removes an object with its descendants (never the root).
   void Remove(ObjectId id);
   // Sum of the Translation attributes from the root down to the object.
@@ -167,6 +171,8 @@ bool MayContain(std::string_view parentType, std::string_view childType);
 // Why `name` cannot name an object; empty when it can.
 std::string BadName(std::string_view name);
 inline constexpr std::string_view kConstraintTypes[] = {"Point", "Aim", "Orient"};
+// The channels that solving (T) and retargeting (R) give a bone: its position on each axis.
+inline constexpr std::string_view kBoneChannels[] = {"TX", "TY", "TZ", "RX", "RY", "RZ"};
 
 // The demonstration take: deterministic, smooth trajectories with a few occlusion gaps.
 Scene DemoScene(int frames);

@@ -246,6 +246,8 @@ Scene ReadScene(std::string_view text) {
         auto& c = next("channel", 4, 4);
         std::string cname = Decode(c[1], at);
         Channel* channel = object->FindChannel(cname);
+        bool solved = std::find(std::begin(kBoneChannels), std::end(kBoneChannels), cname) != std::end(kBoneChannels);
+        if (!channel && object->type == "Bone" && solved) channel = &scene.AddChannel(*object, cname);
         if (!channel || std::find(seenChannels.begin(), seenChannels.end(), cname) != seenChannels.end()) Bad(at, "an unknown or repeated channel");
         seenChannels.push_back(cname);
         auto fallback = ParseDouble(c[2]);
