@@ -1,5 +1,9 @@
 """Offline processing against real hosts: fix-occlusion on the demo take, checked against the smooth
 motion that gaps were cut from, and its settings and refusals."""
+import os
+import subprocess
+import sys
+
 import numpy as np
 import pytest
 
@@ -135,17 +139,18 @@ def seen_frames(app, subject):
 
 def test_the_stages_record_their_documented_results_in_order(app):
     seen = sum(int(seen_frames(app, s).sum()) for s in ("Alice", "Bob"))
+    alice = int(seen_frames(app, "Alice").sum())
     expected = {
         "OfflineCalibrateCameras": "cameras=4;Enabled=true,",
         "OfflineReconstruct": f"trajectories=24,seen={seen};EnvironmentalDriftTolerance=1.5,",
-        "OfflineLabelROM Alice": "markers=12,labelled=12;StandardDeviation=2,",
-        "OfflineCalibrateLabelingSubjects Alice": "markers=12,labelled=12;RestImportance=1,",
-        "OfflineAutoLabel Alice": "markers=12,labelled=12;UseLabelingClusters=true,",
+        "OfflineLabelROM Alice": "markers=12,frames=867;StandardDeviation=2,",
+        "OfflineCalibrateLabelingSubjects Alice": "constraints=12,frames=200;RestImportance=1,",
+        "OfflineAutoLabel Alice": f"labelled={alice},moved=0,dropped=0;UseLabelingClusters=true,",
         "OfflineFixOcclusion Alice": "filled=3,rigid=1,left=1;Enabled=true,",
         "OfflineCreateSolvingSetupFromLS Alice": "bones=13,constraints=12",
-        "OfflineCalibrateSolvingSubjects Alice": "bones=13,constraints=12;PriorImportance=1,",
-        "OfflineSolve Alice": "frames=920;PriorImportance=1,",
-        "OfflineRetarget Alice": "frames=920",
+        "OfflineCalibrateSolvingSubjects Alice": "bones=13,calibrated=4;PriorImportance=1,",
+        "OfflineSolve Alice": "bones=13,frames=920;PriorImportance=1,",
+        "OfflineRetarget Alice": "bones=13,scale=1.0416666666666667",
     }
     for number, (operation, args) in enumerate(CHAIN):
         getattr(app, operation)(*args)
@@ -199,7 +204,7 @@ def test_quick_post_runs_its_stages_in_order_and_stops_at_the_first_that_cannot_
     for operation, args in CHAIN[6:8]:
         getattr(app, operation)(*args)
     app.OfflineQuickPost("Alice", "")
-    assert state(app)["Pipeline OfflineSolve Alice"].startswith("frames=920;")
+    assert state(app)["Pipeline OfflineSolve Alice"].startswith("bones=13,frames=920;")
 
 
 def test_a_stage_records_the_settings_it_ran_with(app):
@@ -211,3 +216,193 @@ def test_a_stage_records_the_settings_it_ran_with(app):
     app.OfflineSolve("Alice")
     assert "PriorImportance=5.5," in state(app)["Pipeline OfflineSolve Alice"]
     assert "PriorImportance=1," in state(app)["Pipeline OfflineCalibrateSolvingSubjects Alice"]
+
+
+# ---- What the stages compute: templates, labels, offsets, bone paths ----
+
+def run_chain(app, stages):
+    for operation, args in CHAIN[:stages]:
+        getattr(app, operation)(*args)
+
+
+def template(app, subject, marker):
+    """A marker's label template: its offset from the subject's centroid and its reach."""
+    obj = app.SceneGetObject(f"/{subject}/{marker}")[0]
+    value = app.ParameterGet(obj, app.ObjectGetParameter(obj, 2, "Template"), 2, "Value")
+    x, y, z, reach = map(float, value.split(","))
+    return np.array([x, y, z]), reach
+
+
+def test_rom_labelling_places_each_template_where_the_marker_sits_relative_to_the_others(app):
+    head, truth = trajectory(app, "Alice", "LFHD"), trajectory(app, "Alice", "RFHD")
+    run_chain(app, 3)
+    apart = template(app, "Alice", "LFHD")[0] - template(app, "Alice", "RFHD")[0]
+    assert np.abs(apart - (head[0] - truth[0])[:, 0]).max() < 1e-6  # the head moves rigidly
+    assert template(app, "Alice", "LFHD")[1] == 30  # SeparationDistance: the head barely swings
+    assert template(app, "Alice", "LANK")[1] > 300  # StandardDeviation x the ankle's wide swing
+
+
+def swap(app, subject, one, other):
+    a, b = app.GetTrajectory(subject, one), app.GetTrajectory(subject, other)
+    app.SetTrajectory(subject, one, *b)
+    app.SetTrajectory(subject, other, *a)
+
+
+def move_to_new_marker(app, subject, marker, new):
+    """Moves a marker's trajectory to a new marker of the subject, which has no label template."""
+    app.SceneCreateObject("Marker", new, app.SceneGetObject(f"/{subject}")[0], "")
+    data = app.GetTrajectory(subject, marker)
+    app.SetTrajectory(subject, new, *data)
+    app.SetTrajectory(subject, marker, *data[:3], [False] * len(data[3]))
+
+
+@pytest.mark.parametrize("scramble, moved", [
+    (lambda app: swap(app, "Alice", "LANK", "RANK"), 1965),   # both ankles, each seen but in its gap
+    (lambda app: swap(app, "Alice", "LFHD", "STRN"), 2000),
+    (lambda app: move_to_new_marker(app, "Alice", "LKNE", "U1"), 1000),
+])
+def test_automatic_labelling_gives_each_trajectory_back_its_label(app, scramble, moved):
+    before = {marker: trajectory(app, "Alice", marker) for marker in app.GetMarkerNames("Alice")}
+    run_chain(app, 4)
+    scramble(app)
+    app.OfflineAutoLabel("Alice", "")
+    for marker, (values, seen) in before.items():
+        after, now = trajectory(app, "Alice", marker)
+        assert (now == seen).all(), marker
+        assert (after[:, seen] == values[:, seen]).all(), marker
+    assert f"moved={moved},dropped=0;" in state(app)["Pipeline OfflineAutoLabel Alice"]
+
+
+def test_a_point_no_label_reaches_stays_unlabelled(app):
+    run_chain(app, 4)
+    app.SceneCreateObject("Marker", "U1", app.SceneGetObject("/Alice")[0], "")
+    x, y, z, seen = app.GetTrajectory("Alice", "LFHD")
+    far = [value + 5000 for value in x]
+    app.SetTrajectory("Alice", "U1", far, y, z, seen)
+    app.OfflineAutoLabel("Alice", "")
+    assert trajectory(app, "Alice", "U1")[0][0].tolist() == far
+    assert trajectory(app, "Alice", "LFHD")[1].tolist() == seen
+
+
+def test_labelling_refuses_templates_closer_than_the_separation_distance(app, tmp_path):
+    run_chain(app, 2)
+    settings = app.record("OfflineGetLabelROMSettings")
+    m.Output_LabelROMSettings_SeparationDistance_set(settings, 200)
+    app.OfflineSetLabelROMSettings(settings)
+    app.SaveFile(str(tmp_path / "before.scene"), "")
+    message = app.refusal("OfflineLabelROM", "Alice", "")[1]
+    assert "of subject 'Alice' lie closer together than the LabelROM setting 'SeparationDistance' (200 mm)" in message
+    app.SaveFile(str(tmp_path / "after.scene"), "")
+    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+
+
+@pytest.mark.parametrize("constraint, markers", [
+    ("LFHD_Head", ("LFHD", "RFHD")),   # half the way from one head marker to the other
+    ("STRN_Thorax", ("STRN", "C7")),
+    ("RASI_Pelvis", ("RASI", "LASI")),
+    ("LWRA_LeftHand", ("LWRA",)),      # alone on its bone: no offset
+])
+def test_subject_calibration_offsets_each_marker_from_the_centre_of_its_bone(app, constraint, markers):
+    run_chain(app, 4)
+    positions = [trajectory(app, "Alice", marker)[0][:, 0] for marker in markers]
+    offset = app.GetConstraintDetails("Alice", "", constraint)[3]
+    assert np.abs(np.array(offset) - (positions[0] - np.mean(positions, axis=0))).max() < 1e-3
+
+
+def bone_path(app, subject, bone_path_, prefix, frames):
+    """A bone's positions (3 x len(frames)) and keys in its channels PREFIX X, Y and Z."""
+    bone = app.SceneGetObject(f"/{subject}/{bone_path_}")[0]
+    channels = [int(app.ObjectGetChannel(bone, prefix + axis)[2]) for axis in "XYZ"]
+    values = np.array([[float(app.ChannelGetValue(bone, c, f, 0, 0, "")[2]) for f in frames] for c in channels])
+    keys = np.array([app.ChannelHasKey(bone, channels[0], f) == "true" for f in frames])
+    return values, keys
+
+
+FRAMES = [1, 130, 420, 860, 1000]  # in and out of Alice's gaps
+
+
+def test_solving_places_each_bone_where_its_markers_put_it(app):
+    run_chain(app, 9)
+    lasi, rasi = trajectory(app, "Alice", "LASI")[0], trajectory(app, "Alice", "RASI")[0]
+    pelvis, keyed = bone_path(app, "Alice", "Pelvis", "T", FRAMES)
+    centre = (lasi + rasi)[:, [f - 1 for f in FRAMES]] / 2
+    assert keyed.all()
+    assert np.abs(pelvis - centre).max() < 1e-3
+
+
+def test_a_bone_without_markers_follows_its_parent_and_one_whose_markers_are_unseen_has_no_key(app):
+    run_chain(app, 9)
+    pelvis = bone_path(app, "Alice", "Pelvis", "T", FRAMES)[0]
+    thigh = bone_path(app, "Alice", "Pelvis/LeftThigh", "T", FRAMES)[0]
+    rest = app.ObjectGetAttributeValue(app.SceneGetObject("/Alice/Pelvis/LeftThigh")[0], "Translation")[2]
+    assert np.abs(thigh - pelvis - np.array([float(v) for v in rest.split(",")])[:, None]).max() < 1e-9
+    hand = bone_path(app, "Alice", "Pelvis/Thorax/RightArm/RightHand", "T", FRAMES)[1]
+    assert hand.tolist() == [True, True, True, False, True]  # RWRA's 0.8 s gap stays after fixing
+
+
+def test_solving_subject_calibration_sets_a_bone_translation_from_its_parent(app):
+    run_chain(app, 8)
+    head = app.ObjectGetAttributeValue(app.SceneGetObject("/Alice/Pelvis/Thorax/Head")[0], "Translation")[2]
+    heads = [trajectory(app, "Alice", marker)[0][:, 0] for marker in ("LFHD", "RFHD")]
+    thorax = [trajectory(app, "Alice", marker)[0][:, 0] for marker in ("C7", "STRN")]
+    expected = np.mean(heads, axis=0) - np.mean(thorax, axis=0)
+    assert np.abs(np.array([float(v) for v in head.split(",")]) - expected).max() < 1e-6
+
+
+def test_retargeting_scales_each_bone_offset_from_the_root_to_the_standard_height(app):
+    run_chain(app, 10)
+    pelvis = bone_path(app, "Alice", "Pelvis", "T", FRAMES)[0]
+    head = bone_path(app, "Alice", "Pelvis/Thorax/Head", "T", FRAMES)[0]
+    retargeted = bone_path(app, "Alice", "Pelvis/Thorax/Head", "R", FRAMES)[0]
+    assert np.abs(retargeted - (pelvis + (head - pelvis) * 1750 / 1680)).max() < 1e-6
+
+
+def test_solved_bone_channels_are_kept_in_the_scene_file(app, tmp_path):
+    run_chain(app, 10)
+    app.SaveFile(str(tmp_path / "solved.scene"), "")
+    app.LoadFile(str(tmp_path / "solved.scene"))
+    app.SaveFile(str(tmp_path / "again.scene"), "")
+    assert (tmp_path / "again.scene").read_bytes() == (tmp_path / "solved.scene").read_bytes()
+
+
+# ---- Long stages: progress in the log, and other clients served meanwhile ----
+
+STAGE_IN_CHILD = """
+import sys
+sys.path[:0] = [sys.argv[1]]
+import companion
+from appclient import Client
+companion.register()
+
+class Host:
+    address, port = "127.0.0.1", int(sys.argv[2])
+
+Client(Host).OfflineFixOcclusion("", "")
+"""
+
+
+def test_reads_are_answered_and_writes_wait_while_another_client_runs_a_long_stage(start_host):
+    host = start_host("--frames", "20000", "--fault", "stage-delay=40")
+    reader = Client(host)
+    stage = subprocess.Popen([sys.executable, "-c", STAGE_IN_CHILD, os.path.dirname(__file__), str(host.port)])
+    try:
+        answered = 0
+        for _ in range(5000):
+            if "Pipeline OfflineFixOcclusion" in host.log() or stage.poll() is not None:
+                break
+            started = "OfflineFixOcclusion subject 'Alice': 10% done" in host.log()
+            reader.GetTrajectoryAtFrame("Alice", "LANK", 1)
+            if started and "Pipeline OfflineFixOcclusion" not in host.log():
+                answered += 1
+                reader.SetSceneName("Renamed")  # a write waits for the stage to finish
+                assert "Pipeline OfflineFixOcclusion Bob" in host.log()
+                break
+        assert answered == 1
+        assert stage.wait(timeout=60) == 0
+    finally:
+        stage.kill()
+        stage.wait()
+        reader.close()
+    log = host.log()
+    assert "OfflineFixOcclusion subject 'Bob': 100% done" in log
+    assert log.index("OfflineFixOcclusion subject 'Alice': 50% done") < log.index("Pipeline OfflineFixOcclusion Alice")
