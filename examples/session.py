@@ -1,10 +1,12 @@
-"""A first session with the application: an account of the scene and a plot of one marker.
+"""A first session with the application: an account of the scene, then one marker's gaps filled and
+its motion smoothed, plotted before and after.
 
     python examples/session.py                  # starts its own application on a free port
     python examples/session.py HOST PORT        # uses a running one
     python examples/session.py --plot out.png --subject Bob --marker LKNE
 
-The plot (session.png by default) shows the marker's x, y and z over time with its gaps shaded.
+The plot (session.png by default) shows the marker's x, y and z over time with its gaps shaded, as
+captured and after OfflineFixOcclusion (gaps of up to one second) and FilterApplyFIR (6 Hz).
 """
 from __future__ import annotations
 
@@ -12,7 +14,7 @@ import argparse
 import contextlib
 import os
 import tempfile
-from typing import Iterator, List, Sequence, Tuple
+from typing import Any, Iterator, List, Sequence, Tuple
 
 import matplotlib
 
@@ -91,23 +93,44 @@ def save_and_reload(client: Client3.ZarvoPelluxPostClient) -> None:
           f"{'' if after == before else ' (changed!)'}")
 
 
-def plot(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str, path: str) -> None:
-    trajectory = client.GetTrajectory(subject, marker).check()
+def draw(axes: Any, trajectory: Client3.Output_GetTrajectory, title: str) -> None:
+    """One marker's x, y and z over time, unseen frames left out and gaps shaded."""
     seen = list(trajectory.E)
     seconds = [index / FRAME_RATE for index in range(len(seen))]
-    x = list(trajectory.X)
-    print(f"{subject}'s {marker} travels from x = {x[0]:.0f} mm to x = {x[-1]:.0f} mm")
-
-    figure, axes = plt.subplots(figsize=(10, 4))
-    for name, values in (("x", x), ("y", list(trajectory.Y)), ("z", list(trajectory.Z))):
+    for name, values in (("x", trajectory.X), ("y", trajectory.Y), ("z", trajectory.Z)):
         shown = [value if visible else float("nan") for value, visible in zip(values, seen)]
         axes.plot(seconds, shown, label=name)
     for number, (first, last) in enumerate(gaps(seen)):
         axes.axvspan((first - 1) / FRAME_RATE, last / FRAME_RATE, color="red", alpha=0.2, label="gap" if number == 0 else None)
-    axes.set_xlabel("time (s)")
     axes.set_ylabel("position (mm)")
-    axes.set_title(f"{subject} {marker}")
+    axes.set_title(title)
     axes.legend(loc="upper left")
+
+
+def process(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str) -> None:
+    """Fills the subject's gaps of up to one second, then smooths the marker with a 6 Hz low-pass."""
+    settings = client.OfflineGetOcclusionFixingSettings().check()
+    settings.TransitionTime = 1.0
+    client.OfflineSetOcclusionFixingSettings(settings).check()
+    client.OfflineFixOcclusion(subject, "").check()
+    obj = client.SceneGetObject(f"/{subject}/{marker}").check().ID
+    x = int(str(client.ObjectGetChannel(obj, "X").check().Str))
+    client.FilterApplyFIR(obj, x, "XYZ", False, 21, 6.0, 0.0, 4.0).check()
+
+
+def plot(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str, path: str) -> None:
+    before = client.GetTrajectory(subject, marker).check()
+    x = list(before.X)
+    print(f"{subject}'s {marker} travels from x = {x[0]:.0f} mm to x = {x[-1]:.0f} mm")
+    process(client, subject, marker)
+    after = client.GetTrajectory(subject, marker).check()
+    filled = sum(1 for was, now in zip(before.E, after.E) if now and not was)
+    print(f"occlusion fixing and a 6 Hz low-pass: {filled} frames of {subject}'s {marker} filled")
+
+    figure, (top, bottom) = plt.subplots(2, 1, figsize=(10, 7), sharex=True)
+    draw(top, before, f"{subject} {marker} as captured")
+    draw(bottom, after, f"{subject} {marker} after occlusion fixing and a 6 Hz low-pass")
+    bottom.set_xlabel("time (s)")
     figure.tight_layout()
     figure.savefig(path)
     plt.close(figure)

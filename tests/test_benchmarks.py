@@ -56,3 +56,14 @@ def test_suite_quick_prints_every_row_against_its_floor():
         assert ours[0].isdigit() and floor[0].isdigit() and float(ratio) > 0, (shape, rows[shape])
     ours, floor, ratio = rows["round trip to the host (GetFrameCount)"]
     assert ours[0].isdigit() and floor == ratio == "-", rows
+
+
+def test_bench_processing_quick_prints_its_table():
+    done = subprocess.run([sys.executable, os.path.join(BENCHMARKS, "bench_processing.py"), "--quick"],
+                          capture_output=True, text=True, timeout=600)
+    assert done.returncode == 0, done.stderr
+    lines = [line.strip() for line in done.stdout.splitlines()]
+    for command in ("FilterApplyFIR, one marker, 61 taps", "OfflineFixOcclusion, both subjects"):
+        for who in ("NumPy/SciPy", "client3-host"):
+            row = f"{command}: {who}"
+            assert any(line.startswith(row) and len(line.split()) == len(row.split()) + 2 for line in lines), (row, done.stdout)

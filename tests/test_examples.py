@@ -24,6 +24,7 @@ def test_session_prints_the_account_and_writes_the_plot(tmp_path):
     assert "  RWRA   seen in   920 frames, 1 gap(s)" in lines
     assert "  /Alice     Subject   37 objects below" in lines
     assert "saved, emptied (0 subjects) and reloaded: subjects Alice, Bob" in lines
+    assert "occlusion fixing and a 6 Hz low-pass: 80 frames of Alice's RWRA filled" in lines
     with open(tmp_path / "session.png", "rb") as plot:
         assert plot.read(8) == b"\x89PNG\r\n\x1a\n"
 
