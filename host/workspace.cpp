@@ -227,9 +227,9 @@ constexpr HandlerEntry kHandlers[] = {
     {Id::RemoveScriptPath, &RemoveScriptPath},
     {Id::ReparseScriptPaths, &ReparseScriptPaths},
     {Id::DatabaseCreate, &DatabaseCreate},
-    {Id::DatabaseGetCurrent, &DatabaseGetCurrent},
+    {Id::DatabaseGetCurrent, &DatabaseGetCurrent, Access::Read},
     {Id::DatabaseSetCurrent, &DatabaseSetCurrent},
-    {Id::DatabaseGetMarkedTakes, &DatabaseGetMarkedTakes},
+    {Id::DatabaseGetMarkedTakes, &DatabaseGetMarkedTakes, Access::Read},
 };
 
 }  // namespace

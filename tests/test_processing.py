@@ -365,6 +365,35 @@ def test_solved_bone_channels_are_kept_in_the_scene_file(app, tmp_path):
     assert (tmp_path / "again.scene").read_bytes() == (tmp_path / "solved.scene").read_bytes()
 
 
+
+def hide_marker(app):
+    x, y, z, seen = app.GetTrajectory("Alice", "C7")
+    app.SetTrajectory("Alice", "C7", x, y, z, [False] * len(seen))
+
+
+def break_constraint(app):
+    app.ObjectSetAttributeValue(app.SceneGetObject("/Alice/STRN_Thorax")[0], "Source", "NOPE")
+
+
+def zero_height(app):
+    alice = app.SceneGetObject("/Alice")[0]
+    app.ParameterSet(alice, app.ObjectGetParameter(alice, 1, "Height"), 1, "Value", "0")
+
+
+@pytest.mark.parametrize("ran, spoil, operation, args, message", [
+    (2, hide_marker, "OfflineLabelROM", ("Alice", ""), "no frame of the take sees every marker of subject 'Alice'"),
+    (4, break_constraint, "OfflineCreateSolvingSetupFromLS", ("Alice",),
+     "constraint 'STRN_Thorax' of subject 'Alice' ties marker 'NOPE', which the subject does not have"),
+    (9, zero_height, "OfflineRetarget", ("Alice",), "subject 'Alice' has no positive Height parameter to retarget from"),
+])
+def test_a_stage_that_cannot_compute_its_result_is_refused_and_changes_nothing(app, tmp_path, ran, spoil, operation, args, message):
+    run_chain(app, ran)
+    spoil(app)
+    app.SaveFile(str(tmp_path / "before.scene"), "")
+    assert app.refusal(operation, *args)[1] == message
+    app.SaveFile(str(tmp_path / "after.scene"), "")
+    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+
 # ---- Long stages: progress in the log, and other clients served meanwhile ----
 
 STAGE_IN_CHILD = """
