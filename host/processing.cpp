@@ -25,6 +25,10 @@ Point operator+(Point a, const Point& b) { return {a[0] + b[0], a[1] + b[1], a[2
 Point operator-(Point a, const Point& b) { return {a[0] - b[0], a[1] - b[1], a[2] - b[2]}; }
 Point operator*(Point a, double k) { return {a[0] * k, a[1] * k, a[2] * k}; }
 double Distance(const Point& a, const Point& b) { return std::hypot(a[0] - b[0], a[1] - b[1], a[2] - b[2]); }
+double Squared(const Point& a, const Point& b) {
+  Point d = a - b;
+  return d[0] * d[0] + d[1] * d[1] + d[2] * d[2];
+}
 std::string PointText(const Point& p) { return NumberText(p[0]) + "," + NumberText(p[1]) + "," + NumberText(p[2]); }
 Point PointOf(const std::string& text) {
   std::vector<double> v = VectorOf(text);
@@ -225,12 +229,12 @@ Outcome LabelROM(Scene& scene, Object& subject, Progress& progress) {
     for (std::size_t i = 0; i < whole.size(); ++i) mean = mean + offset(i);
     mean = mean * (1.0 / static_cast<double>(whole.size()));
     double square = 0;
-    for (std::size_t i = 0; i < whole.size(); ++i) square += std::pow(Distance(offset(i), mean), 2);
+    for (std::size_t i = 0; i < whole.size(); ++i) square += Squared(offset(i), mean);
     double spread = std::sqrt(square / static_cast<double>(whole.size()));
     Point kept{};
     std::size_t count = 0;
     for (std::size_t i = 0; i < whole.size(); ++i)
-      if (Distance(offset(i), mean) <= deviations * spread) kept = kept + offset(i), ++count;
+      if (Squared(offset(i), mean) <= square / static_cast<double>(whole.size()) * deviations * deviations) kept = kept + offset(i), ++count;
     labels.push_back({count ? kept * (1.0 / static_cast<double>(count)) : mean, std::max(deviations * spread, separation)});
   }
   for (std::size_t a = 0; a < tracks.size(); ++a)
@@ -246,30 +250,54 @@ Outcome LabelROM(Scene& scene, Object& subject, Progress& progress) {
 }
 
 // Gives each label the nearest free point to `centre` + its offset, within its reach unless
-// `anywhere`, the closest pairs first; `taken[label]` is the point's index, or -1.
+// `anywhere`, the closest pairs first; `taken[label]` is the point's index, or -1. When no two
+// labels have the same nearest point, that is each label's nearest point, found without sorting.
 struct Pairing {
-  double distance;
+  double distance;  // squared
   std::size_t label, point;
-  bool operator<(const Pairing& o) const { return distance < o.distance || (distance == o.distance && label < o.label); }
+  bool operator<(const Pairing& o) const {
+    return distance != o.distance ? distance < o.distance : label != o.label ? label < o.label : point < o.point;
+  }
 };
 
-void Assign(const std::vector<Label>& labels, const Point& centre, bool anywhere, const std::vector<Point>& points,
-            std::vector<Pairing>& pairs, std::vector<int>& taken) {
-  pairs.clear();
-  for (std::size_t l = 0; l < labels.size(); ++l)
-    for (std::size_t p = 0; p < points.size(); ++p)
-      if (double d = Distance(points[p], centre + labels[l].offset); anywhere || d <= labels[l].reach) pairs.push_back({d, l, p});
-  std::sort(pairs.begin(), pairs.end());
-  taken.assign(labels.size(), -1);
-  std::vector<bool> used(points.size(), false);
-  for (const Pairing& pair : pairs)
-    if (taken[pair.label] < 0 && !used[pair.point]) taken[pair.label] = static_cast<int>(pair.point), used[pair.point] = true;
-}
+struct Assignment {
+  std::vector<Pairing> pairs;
+  std::vector<int> taken;
+  std::vector<bool> used;
+
+  void Assign(const std::vector<Label>& labels, const Point& centre, bool anywhere, const std::vector<Point>& points) {
+    pairs.clear();
+    taken.assign(labels.size(), -1);
+    used.assign(points.size(), false);
+    bool shared = false;
+    for (std::size_t l = 0; l < labels.size(); ++l) {
+      Point at = centre + labels[l].offset;
+      double reach = labels[l].reach * labels[l].reach, best = 0;
+      for (std::size_t p = 0; p < points.size(); ++p) {
+        double d = Squared(points[p], at);
+        if (!anywhere && d > reach) continue;
+        pairs.push_back({d, l, p});
+        if (taken[l] < 0 || d < best) taken[l] = static_cast<int>(p), best = d;
+      }
+      if (taken[l] >= 0) {
+        shared = shared || used[static_cast<std::size_t>(taken[l])];
+        used[static_cast<std::size_t>(taken[l])] = true;
+      }
+    }
+    if (!shared) return;
+    std::sort(pairs.begin(), pairs.end());
+    taken.assign(labels.size(), -1);
+    used.assign(points.size(), false);
+    for (const Pairing& pair : pairs)
+      if (taken[pair.label] < 0 && !used[pair.point]) taken[pair.label] = static_cast<int>(pair.point), used[pair.point] = true;
+  }
+};
 
 // Labels every frame on its own: the points are the positions of the subject's markers seen there,
-// labelled or not. Three passes place the template: at the points' centroid, pairing labels and
-// points regardless of reach; at the median (per axis) of where those pairs put it, now within
-// reach; and at the mean of where the second pass's pairs put it. A label without a point in reach
+// labelled or not. Three passes place the template: where it was placed at the frame before (at the
+// first frame, or after one without points: the points' median less the offsets' median, per axis),
+// pairing labels and points regardless of reach; at the median (per axis) of where those pairs put
+// it, now within reach; and at the mean of where the second pass's pairs put it. A label without a point in reach
 // leaves its marker unseen at that frame. The points no label takes go to the unlabelled markers, in order;
 // those that find no unlabelled marker are dropped.
 Outcome AutoLabel(Scene& scene, Object& subject, Progress& progress) {
@@ -293,39 +321,54 @@ Outcome AutoLabel(Scene& scene, Object& subject, Progress& progress) {
     for (int a = 0; a < 3; ++a) results[i].values[a] = order[i].axes[a]->values;
     results[i].seen.assign(frames, false);
   }
-  Point mean{};
-  for (const Label& l : labels) mean = mean + l.offset;
-  mean = mean * (1.0 / static_cast<double>(labels.size()));
+  std::vector<double> axis;
+  auto median = [&axis] {
+    std::nth_element(axis.begin(), axis.begin() + static_cast<std::ptrdiff_t>(axis.size() / 2), axis.end());
+    return axis[axis.size() / 2];
+  };
+  Point middle;  // the offsets' median
+  for (std::size_t a = 0; a < 3; ++a) {
+    axis.clear();
+    for (const Label& l : labels) axis.push_back(l.offset[a]);
+    middle[a] = median();
+  }
+  std::optional<Point> last;  // where the template was placed at the frame before
   std::vector<Point> points;
   std::vector<std::size_t> from;
-  std::vector<Pairing> pairs;
-  std::vector<int> taken;
-  std::vector<double> axis;
+  Assignment assignment;
+  const std::vector<int>& taken = assignment.taken;
+  std::vector<bool> used;
   std::size_t assigned = 0, moved = 0, dropped = 0;
   for (std::size_t f = 0; f < frames; ++f) {
     progress.At(f);
     points.clear(), from.clear();
     for (std::size_t i = 0; i < order.size(); ++i)
       if (order[i].Seen(f)) points.push_back(order[i].At(f)), from.push_back(i);
-    if (points.empty()) continue;
-    Point centre{};
-    for (const Point& p : points) centre = centre + p;
-    centre = centre * (1.0 / static_cast<double>(points.size())) - mean;
-    Assign(labels, centre, true, points, pairs, taken);
+    if (points.empty()) {
+      last.reset();
+      continue;
+    }
+    Point centre;
+    for (std::size_t a = 0; a < 3 && !last; ++a) {
+      axis.clear();
+      for (const Point& p : points) axis.push_back(p[a]);
+      centre[a] = median() - middle[a];
+    }
+    assignment.Assign(labels, last ? *last : centre, true, points);
     for (std::size_t a = 0; a < 3; ++a) {
       axis.clear();
       for (std::size_t l = 0; l < labels.size(); ++l)
         if (taken[l] >= 0) axis.push_back(points[static_cast<std::size_t>(taken[l])][a] - labels[l].offset[a]);
-      std::nth_element(axis.begin(), axis.begin() + static_cast<std::ptrdiff_t>(axis.size() / 2), axis.end());
-      centre[a] = axis[axis.size() / 2];
+      centre[a] = median();
     }
-    Assign(labels, centre, false, points, pairs, taken);
+    assignment.Assign(labels, centre, false, points);
     Point sum{};
     std::size_t count = 0;
     for (std::size_t l = 0; l < labels.size(); ++l)
       if (taken[l] >= 0) sum = sum + (points[static_cast<std::size_t>(taken[l])] - labels[l].offset), ++count;
-    if (count) Assign(labels, sum * (1.0 / static_cast<double>(count)), false, points, pairs, taken);
-    std::vector<bool> used(points.size(), false);
+    if (count) assignment.Assign(labels, centre = sum * (1.0 / static_cast<double>(count)), false, points);
+    last = centre;
+    used.assign(points.size(), false);
     auto put = [&](std::size_t marker, std::size_t point) {
       for (int a = 0; a < 3; ++a) results[marker].values[a][f] = points[point][static_cast<std::size_t>(a)];
       results[marker].seen[f] = true;
