@@ -330,6 +330,16 @@ def test_solving_places_each_bone_where_its_markers_put_it(app):
     assert np.abs(pelvis - centre).max() < 1e-3
 
 
+
+def test_a_bone_with_one_marker_unseen_is_still_at_the_centre_of_its_markers(app):
+    run_chain(app, 9)
+    heads = [trajectory(app, "Alice", marker)[0][:, 504] for marker in ("LFHD", "RFHD")]
+    cut(app, "Alice", "LFHD", 500, 10)
+    app.OfflineSolve("Alice")
+    head, keyed = bone_path(app, "Alice", "Pelvis/Thorax/Head", "T", [505])
+    assert keyed.all()
+    assert np.abs(head[:, 0] - np.mean(heads, axis=0)).max() < 1e-3
+
 def test_a_bone_without_markers_follows_its_parent_and_one_whose_markers_are_unseen_has_no_key(app):
     run_chain(app, 9)
     pelvis = bone_path(app, "Alice", "Pelvis", "T", FRAMES)[0]
