@@ -50,8 +50,8 @@ class SceneLock {
   std::mutex gate_;
 };
 
-// What a command may use: the scene (locked for the command's whole run) and the connection's own
-// settings.
+// What a command may use: the scene (held for the command's whole run, as its Access says) and the
+// connection's own settings.
 struct Context {
   Scene& scene;
   std::string& language;

@@ -1,5 +1,5 @@
 // The application's network side: it accepts clients on one address, serves each on a thread of its
-// own, and runs their commands one at a time against the shared scene.
+// own, and runs their commands against the shared scene: reads side by side, changes one at a time.
 #pragma once
 
 #include <atomic>

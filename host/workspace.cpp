@@ -1,6 +1,6 @@
 // The application's workspace outside the scene: the script search path and the capture database.
-// Both outlive a new or loaded scene. Commands run one at a time (each holds the scene lock), so the
-// workspace needs no lock of its own.
+// Both outlive a new or loaded scene. The scene lock guards them too: the commands that change them
+// hold it alone, and those that only read them share it.
 //
 // A capture database is a directory holding the file `client3.database`; its sessions are the
 // directories inside it, and a session's takes the directories inside the session. A take is marked

@@ -376,9 +376,9 @@ def test_solved_bone_channels_are_kept_in_the_scene_file(app, tmp_path):
 
 
 
-def hide_marker(app):
-    x, y, z, seen = app.GetTrajectory("Alice", "C7")
-    app.SetTrajectory("Alice", "C7", x, y, z, [False] * len(seen))
+def hide_marker(app, subject="Alice"):
+    x, y, z, seen = app.GetTrajectory(subject, "C7")
+    app.SetTrajectory(subject, "C7", x, y, z, [False] * len(seen))
 
 
 def break_constraint(app):
@@ -392,6 +392,8 @@ def zero_height(app):
 
 @pytest.mark.parametrize("ran, spoil, operation, args, message", [
     (2, hide_marker, "OfflineLabelROM", ("Alice", ""), "no frame of the take sees every marker of subject 'Alice'"),
+    (2, lambda app: hide_marker(app, "Bob"), "OfflineLabelROM", ("", ""),  # Alice, labelled first, is not written either
+     "no frame of the take sees every marker of subject 'Bob'"),
     (4, break_constraint, "OfflineCreateSolvingSetupFromLS", ("Alice",),
      "constraint 'STRN_Thorax' of subject 'Alice' ties marker 'NOPE', which the subject does not have"),
     (9, zero_height, "OfflineRetarget", ("Alice",), "subject 'Alice' has no positive Height parameter to retarget from"),
