@@ -1,3 +1,4 @@
+import gc
 import os
 import subprocess
 import sys
@@ -66,7 +67,10 @@ def companion_classes(registered_classes):
 
 @pytest.fixture
 def safe_string_class():
-    """Lets a test register its own class for SafeString; the companion class is put back after."""
+    """Lets a test register its own class for SafeString; the companion class is put back after.
+    Garbage that earlier tests left in reference cycles is collected first, so that none of their
+    SafeString proxies reaches the test's class."""
+    gc.collect()
     yield
     companion._Client3.SafeString_swigregister(companion.classes["SafeString"])
 
