@@ -1,6 +1,6 @@
 // client3-host: the post-processing application, serving one scene to its clients.
 //
-//   client3-host [--host 127.0.0.1] [--port 8870] [--scene demo|empty|FILE] [--frames 1000]
+//   client3-host [--host 127.0.0.1] [--port 8870] [--scene demo|empty|FILE] [--frames 1000] [--watch-stdin]
 //
 // The first line on standard output is "listening on HOST:PORT" (with --port 0, the port the system
 // picked). The log goes to standard error. SIGINT and SIGTERM stop it cleanly.
@@ -10,6 +10,7 @@
 #include <cstring>
 #include <string>
 #include <string_view>
+#include <thread>
 
 #include "host/scenefile.h"
 #include "host/server.h"
@@ -23,6 +24,16 @@ namespace {
 std::atomic<bool> stopRequested{false};
 void RequestStop() { stopRequested = true; }
 
+// --watch-stdin: the program that started the application holds the other end of its standard input;
+// when that end closes (the program ended, however abruptly), the application stops.
+void StopAtEndOfInput() {
+  std::thread([] {
+    while (std::fgetc(stdin) != EOF) {
+    }
+    RequestStop();
+  }).detach();
+}
+
 bool ParseInt(std::string_view text, int& out, int least, int most) {
   std::optional<int> value = ParseNumber<int>(text);
   if (!value || *value < least || *value > most) return false;
@@ -30,7 +41,8 @@ bool ParseInt(std::string_view text, int& out, int least, int most) {
   return true;
 }
 
-// KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, frames=N.
+// KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, frames=N,
+// exit=N.
 bool ParseFault(std::string_view fault, Options& options) {
   std::string command;
   if (auto at = fault.find('@'); at != std::string_view::npos) command = fault.substr(at + 1), fault = fault.substr(0, at);
@@ -40,6 +52,7 @@ bool ParseFault(std::string_view fault, Options& options) {
   if (!value.empty() && !ParseInt(value, number, -2147483647, 2147483647)) return false;
   if (kind == "frames") return number >= 0 && (options.faults.framesPerFrame = number, true);
   if (kind == "stage-delay") return number >= 0 && (options.faults.stageDelay = number, true);
+  if (kind == "exit") return number > 0 && (options.exitAt = number, options.exitCommand = command, true);
   static const std::pair<std::string_view, ReplyFault::Kind> kinds[] = {
       {"delay", ReplyFault::Delay}, {"garbage", ReplyFault::Garbage}, {"close", ReplyFault::Close},
       {"text", ReplyFault::Text},   {"status", ReplyFault::Status},   {"oversize", ReplyFault::Oversize}};
@@ -57,6 +70,7 @@ int Usage(const char* problem) {
                "  --scene SCENE    demo (default), empty, or a scene file\n"
                "  --frames N       frames of the demo and empty scenes, 1 to 1000000 (default 1000)\n"
                "  --max-clients N  clients served at once (default 64)\n"
+               "  --watch-stdin    stop when standard input reaches its end\n"
                "  --fault FAULT    test only: misbehave as FAULT says (see the reference page)\n");
   return problem ? 2 : 0;
 }
@@ -68,6 +82,10 @@ int main(int argc, char** argv) {
   for (int i = 1; i < argc; ++i) {
     std::string_view option = argv[i];
     if (option == "--help" || option == "-h") return Usage(nullptr);
+    if (option == "--watch-stdin") {
+      StopAtEndOfInput();
+      continue;
+    }
     if (i + 1 >= argc) return Usage(("option " + std::string(option) + " needs a value").c_str());
     std::string_view value = argv[++i];
     int maxClients = 0;

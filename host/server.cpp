@@ -2,6 +2,7 @@
 #include "host/server.h"
 
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <list>
 #include <memory>
@@ -31,6 +32,7 @@ struct Shared {
   SceneLock sceneLock;          // held shared by reads and stages at work, alone by writes
   std::mutex writeLock;         // held by every command but reads for its whole run: one writer at a time
   const Options& options;
+  std::atomic<int> requests{0};  // counted for the exit fault only
 };
 
 struct Client {
@@ -114,6 +116,14 @@ void NumbersAsText(Writer& reply, std::size_t outputsAt, Id id) {
   reply = std::move(rewritten);
 }
 
+// The exit fault: the process ends on the spot, as if it had crashed in the middle of a command.
+void ExitOnFault(Shared& shared, Id id) {
+  const Options& options = shared.options;
+  if (options.exitAt > 0 && (options.exitCommand.empty() || options.exitCommand == CommandOf(id).name) &&
+      ++shared.requests == options.exitAt)
+    std::_Exit(3);
+}
+
 // Sends a reply, or misbehaves as a fault says.
 bool SendReply(Socket& socket, Writer& reply, const ReplyFault* fault) {
   if (!fault) return Send(socket, reply), true;
@@ -192,6 +202,7 @@ void ServeClient(Shared& shared, Client& client) {
         if (access == Access::Write) alone.lock();
         else reading.lock();
         context.reading = access == Access::Stage ? &reading : nullptr;
+        ExitOnFault(shared, id);
         Run(id, context, in, reply);
         ok = true;
       } catch (const Failure& failure) {

@@ -26,6 +26,8 @@ struct Options {
   std::size_t maxClients = 64;
   Faults faults;
   std::vector<ReplyFault> replyFaults;
+  int exitAt = 0;           // test only: exit at once on this request (0: never) ...
+  std::string exitCommand;  // ... counting only this command's requests when not empty
 };
 
 // Serves until `stop` becomes true; returns the process's exit status.
