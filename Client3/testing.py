@@ -53,14 +53,19 @@ def running_host(
         first = process.stdout.readline()
         yield Host(address, _port(first), process)
     finally:
-        process.terminate()
-        try:
-            process.wait(STOP_SECONDS)
-        except subprocess.TimeoutExpired:
-            process.kill()
-            process.wait()
-        if process.stdout is not None:
-            process.stdout.close()
+        stop(process)
+
+
+def stop(process: "subprocess.Popen[str]") -> None:
+    """Stops an application as SIGTERM does (killed if it has not ended within STOP_SECONDS)."""
+    process.terminate()
+    try:
+        process.wait(STOP_SECONDS)
+    except subprocess.TimeoutExpired:
+        process.kill()
+        process.wait()
+    if process.stdout is not None:
+        process.stdout.close()
 
 
 @contextmanager

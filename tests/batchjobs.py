@@ -1,0 +1,35 @@
+"""Jobs for the batch tests: importable by name, as the workers need them."""
+import os
+import time
+
+SUBJECTS = ("Alice", "Bob")
+NOT_A_FUNCTION = 42
+
+
+def unseen(client):
+    """Frames not seen, summed over every marker of the demo's subjects."""
+    total = 0
+    for subject in SUBJECTS:
+        for marker in client.GetMarkerNames(subject).check().Names:
+            total += list(client.GetTrajectory(subject, str(marker)).check().E).count(False)
+    return total
+
+
+def fix(client, take):
+    """Fills the gaps: the frames unseen before and after."""
+    before = unseen(client)
+    client.OfflineFixOcclusion("", "").check()
+    return [before, unseen(client)]
+
+
+def fail_marked(client, take):
+    """Fails on the takes whose name has 'bad' in it, and fixes the others."""
+    if "bad" in os.path.basename(take):
+        raise ValueError(f"refusing {os.path.basename(take)}")
+    return fix(client, take)
+
+
+def slow(client, take):
+    """Takes a while: long enough to be interrupted."""
+    time.sleep(0.5)
+    return fix(client, take)
