@@ -31,5 +31,5 @@ def fail_marked(client, take):
 
 def slow(client, take):
     """Takes a while: long enough to be interrupted."""
-    time.sleep(0.5)
+    time.sleep(1)
     return fix(client, take)

@@ -1,5 +1,7 @@
 """A minimal stand-in for the companion script module: one class per wrapped class, registered through
 its `_swigregister` function, destroyed by its `delete_` function, initialised through `new_` and `_swiginit`."""
+import contextlib
+
 import _Client3
 
 classes = {}
@@ -24,3 +26,16 @@ def register():
                 classes[name] = _make_class(name)
                 getattr(_Client3, attribute)(classes[name])
     return classes
+
+
+@contextlib.contextmanager
+def package_classes():
+    """The Client3 package's classes registered for the block; these stand-ins put back after it."""
+    import Client3
+
+    Client3.register()
+    try:
+        yield
+    finally:
+        for name, cls in register().items():
+            getattr(_Client3, name + "_swigregister")(cls)

@@ -57,12 +57,8 @@ def start_host(tmp_path):
 @pytest.fixture
 def companion_classes(registered_classes):
     """The Client3 package's classes for the test; the suite's own stand-in classes put back after it."""
-    import Client3
-
-    Client3.register()
-    yield
-    for name, cls in registered_classes.items():
-        getattr(companion._Client3, name + "_swigregister")(cls)
+    with companion.package_classes():
+        yield
 
 
 @pytest.fixture
