@@ -14,7 +14,7 @@ from distributed.diagnostics.plugin import WorkerPlugin
 from Client3 import batch
 
 
-class Applications(WorkerPlugin):  # type: ignore[misc]
+class Applications(WorkerPlugin):
     """Stops the applications of a worker when it closes."""
 
     name = "client3-batch-applications"
@@ -29,7 +29,7 @@ def _task(take: str, path: str, plan: Tuple[batch.Job, int, Tuple[str, ...]]) ->
 
 
 def _register(client: distributed.Client) -> None:
-    register = getattr(client, "register_plugin", None) or client.register_worker_plugin
+    register = getattr(client, "register_plugin", None) or getattr(client, "register_worker_plugin")
     register(Applications(), name=Applications.name)
 
 

@@ -238,9 +238,8 @@ def run(job: Job, takes: Iterable[str], *, workers: Optional[int] = None, cluste
         return
     options = tuple(host_options)
     if cluster is not None:
-        from Client3 import _dask
-
-        results = _dask.results(job, todo, cluster, retries, options)
+        dask_engine = importlib.import_module("Client3._dask")  # loaded only when a cluster is given
+        results = dask_engine.results(job, todo, cluster, retries, options)
     else:
         results = _pool_results(job, todo, min(workers or os.cpu_count() or 1, len(todo)), retries, options)
     fd = os.open(out, os.O_WRONLY | os.O_APPEND | os.O_CREAT, 0o666) if out is not None else -1
@@ -283,10 +282,10 @@ def _progress(total: int) -> Any:
     if not sys.stderr.isatty():
         return None
     try:
-        from tqdm import tqdm
+        tqdm = importlib.import_module("tqdm")
     except ImportError:  # no bar without tqdm
         return None
-    return tqdm(total=total, unit="take", file=sys.stderr)
+    return tqdm.tqdm(total=total, unit="take", file=sys.stderr)
 
 
 def main(argv: Optional[List[str]] = None) -> int:

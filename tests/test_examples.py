@@ -41,6 +41,8 @@ def test_session_reports_an_unknown_marker(tmp_path):
     ("write_trajectory.py", "Alice's RWRA: 80 frames unseen before, 0 after"),
     ("process_request.py", "ReleaseType    Release"),
     ("process_request.py", "Value=1680"),
+    ("batch.py", "take12.scene       9       8     1"),
+    ("batch.py", "take13.scene       9       7     2"),
 ])
 def test_example_runs_against_its_own_application(tmp_path, example, expected):
     done = run(os.path.join(ROOT, "examples", example), cwd=tmp_path)
