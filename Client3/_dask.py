@@ -45,11 +45,12 @@ def results(job: batch.Job, todo: Sequence[Tuple[str, str]], cluster: Any, retri
         futures = client.map(_task, takes, [path for _, path in todo], plan=(job, retries, options), pure=False)
         take_of = {future.key: take for future, take in zip(futures, takes)}
         try:
-            for future in distributed.as_completed(futures):
-                try:
-                    yield future.result()
-                except Exception as error:  # the task itself failed: a worker lost too often, for one
-                    yield batch.Result(take_of[future.key], False, f"{type(error).__name__}: {error}", 0.0, "")
+            # Results are gathered in the background as tasks finish; a task that failed (a worker lost
+            # too often, for one) gives its exception.
+            for future, result in distributed.as_completed(futures, with_results=True, raise_errors=False):
+                if isinstance(result, BaseException):
+                    result = batch.Result(take_of[future.key], False, f"{type(result).__name__}: {result}", 0.0, "")
+                yield result
         finally:
             client.cancel(futures)
     finally:

@@ -67,3 +67,15 @@ def test_bench_processing_quick_prints_its_table():
         for who in ("NumPy/SciPy", "client3-host"):
             row = f"{command}: {who}"
             assert any(line.startswith(row) and len(line.split()) == len(row.split()) + 2 for line in lines), (row, done.stdout)
+
+
+def test_bench_batch_quick_prints_its_table():
+    done = subprocess.run([sys.executable, os.path.join(BENCHMARKS, "bench_batch.py"), "--quick"],
+                          capture_output=True, text=True, timeout=600)
+    assert done.returncode == 0, done.stderr
+    lines = [line.split() for line in done.stdout.splitlines()]
+    rates = [line for line in lines if line[-1].endswith("x") and "worker" in line]
+    costs = [line for line in lines if "opening" in line and "rest" in line]
+    assert [line[:2] for line in rates] == [["process", "pool"], ["Dask", "1"]], done.stdout
+    assert [line[:2] for line in costs] == [["process", "pool"], ["Dask", "opening"]], done.stdout
+    assert sum(line[:1] == ["goal:"] for line in lines) == 2, done.stdout
