@@ -9,6 +9,7 @@ from __future__ import annotations
 from typing import Any, Iterator, Sequence, Tuple
 
 import distributed
+from distributed.core import Status
 from distributed.diagnostics.plugin import WorkerPlugin
 
 from Client3 import batch
@@ -20,7 +21,10 @@ class Applications(WorkerPlugin):
     name = "client3-batch-applications"
 
     def teardown(self, worker: Any) -> None:
-        batch.stop_applications()
+        # Each batch registers the plugin again, which tears the one before down: the applications
+        # (perhaps in use by another batch) are stopped only when the worker itself closes.
+        if worker.status in (Status.closing, Status.closing_gracefully, Status.closed, Status.failed):
+            batch.stop_applications()
 
 
 def _task(take: str, path: str, plan: Tuple[batch.Job, int, Tuple[str, ...]]) -> batch.Result:

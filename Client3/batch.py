@@ -311,12 +311,14 @@ def main(argv: Optional[List[str]] = None) -> int:
         job = load_job(arguments.job)
     except ValueError as error:
         parser.error(str(error))
+    takes = list(dict.fromkeys(arguments.takes))
+    skipped = len(_done(arguments.out) & set(takes)) if arguments.resume else 0
     counts = {"done": 0, "failed": 0, "retried": 0}
-    bar = _progress(len(arguments.takes))
+    bar = _progress(len(takes) - skipped)
     began = time.perf_counter()
     interrupted = False
     try:
-        for result in run(job, arguments.takes, workers=arguments.workers, cluster=arguments.cluster,
+        for result in run(job, takes, workers=arguments.workers, cluster=arguments.cluster,
                           out=arguments.out, resume=arguments.resume, retries=arguments.retries):
             counts["done" if result.ok else "failed"] += 1
             counts["retried"] += result.attempts > 1
@@ -331,7 +333,7 @@ def main(argv: Optional[List[str]] = None) -> int:
             bar.close()
     seconds = time.perf_counter() - began
     finished = counts["done"] + counts["failed"]
-    print(f"done {counts['done']}, failed {counts['failed']}, retried {counts['retried']}, "
+    print(f"done {counts['done']}, failed {counts['failed']}, retried {counts['retried']}, skipped {skipped}, "
           f"wall time {seconds:.2f} s, {finished / seconds if seconds else 0.0:.2f} takes per second"
           + (" (interrupted)" if interrupted else ""))
     return 130 if interrupted else 1 if counts["failed"] else 0

@@ -212,8 +212,8 @@ def command(*arguments, **options):
 
 
 @pytest.mark.parametrize("job, bad, status, summary", [
-    ("batchjobs:fix", False, 0, f"done {TAKES}, failed 0, retried 0, "),
-    ("batchjobs:fail_marked", True, 1, f"done {TAKES}, failed 1, retried 0, "),
+    ("batchjobs:fix", False, 0, f"done {TAKES}, failed 0, retried 0, skipped 0, "),
+    ("batchjobs:fail_marked", True, 1, f"done {TAKES}, failed 1, retried 0, skipped 0, "),
 ])
 def test_the_command_line_exits_with_its_status_and_a_summary(takes, tmp_path, job, bad, status, summary):
     extra = [str(tmp_path / "bad.scene")] if bad else []
@@ -274,5 +274,5 @@ def test_ctrl_c_stops_workers_and_applications_and_the_batch_resumes(takes, tmp_
     assert len(first) == 2
     done = command("batchjobs:fix", *three, "--out", str(out), "--resume")
     assert done.returncode == 0, done.stderr
-    assert done.stdout.startswith("done 1, failed 0"), done.stdout
+    assert done.stdout.startswith("done 1, failed 0, retried 0, skipped 2, "), done.stdout
     assert sorted(line["take"] for line in lines(out)) == sorted(three)
