@@ -52,8 +52,9 @@ def results(job: batch.Job, todo: Sequence[Tuple[str, str]], cluster: Any, retri
             # Results are gathered in the background as tasks finish; a task that failed (a worker lost
             # too often, for one) gives its exception.
             for future, result in distributed.as_completed(futures, with_results=True, raise_errors=False):
-                if isinstance(result, BaseException):
-                    result = batch.Result(take_of[future.key], False, f"{type(result).__name__}: {result}", 0.0, "")
+                if future.status != "finished":
+                    error = future.exception()
+                    result = batch.Result(take_of[future.key], False, f"{type(error).__name__}: {error}", 0.0, "")
                 yield result
         finally:
             client.cancel(futures)

@@ -32,6 +32,7 @@ import os
 import signal
 import subprocess
 import sys
+import tempfile
 import threading
 import time
 from concurrent.futures import FIRST_COMPLETED, Future, ProcessPoolExecutor, wait
@@ -132,12 +133,16 @@ def stop_applications() -> None:
         application.stop()
 
 
-def run_take(job: Job, take: str, path: str, retries: int, options: Tuple[str, ...], worker: str = "") -> Result:
-    """Runs one take on one of this process's applications: the unit of work of both engines."""
+def run_take(job: Job, take: str, path: str, retries: int, options: Tuple[str, ...], worker: str = "",
+             mark: str = "") -> Result:
+    """Runs one take on one of this process's applications: the unit of work of both engines. The
+    file `mark`, when given, exists while the take runs."""
     global _busy
     began = time.perf_counter()
     attempts = 0
     _busy += 1
+    if mark:
+        open(mark, "wb").close()
     try:
         while True:
             attempts += 1
@@ -153,6 +158,8 @@ def run_take(job: Job, take: str, path: str, retries: int, options: Tuple[str, .
                 break
     finally:
         _busy -= 1
+        if mark:
+            os.remove(mark)
     return Result(take, ok, value, time.perf_counter() - began, worker or f"process {os.getpid()}", attempts)
 
 
@@ -173,31 +180,40 @@ def _worker_start() -> None:
 def _pool_results(job: Job, takes: Sequence[Tuple[str, str]], workers: int, retries: int,
                   options: Tuple[str, ...]) -> Iterator[Result]:
     """The standard library's process pool. A worker process that ends abruptly breaks the pool: the
-    takes that were not finished go to a new pool, each at most `retries` more times."""
-    breaks: Dict[str, int] = {}
+    unfinished takes go to a new pool, and those that were running (their mark files are left) count
+    it as an attempt, at most `retries` more times."""
+    attempts: Dict[str, int] = {}
     todo = list(takes)
-    while todo:
-        pool = ProcessPoolExecutor(workers, mp_context=multiprocessing.get_context("spawn"), initializer=_worker_start)
-        pending: Dict[Future, Tuple[str, str]] = {  # type: ignore[type-arg]
-            pool.submit(run_take, job, take, path, retries, options): (take, path) for take, path in todo}
-        todo = []
-        try:
-            while pending:
-                finished, _ = wait(pending, return_when=FIRST_COMPLETED)
-                for future in finished:
-                    take, path = pending.pop(future)
-                    try:
-                        yield future.result()
-                    except BrokenProcessPool:
-                        breaks[take] = breaks.get(take, 0) + 1
-                        if breaks[take] > retries:
-                            yield Result(take, False, "the worker process ended during the take", 0.0, "", breaks[take])
-                        else:
-                            todo.append((take, path))
-        finally:
-            for future in pending:
-                future.cancel()
-            pool.shutdown(wait=True)
+    marks = tempfile.TemporaryDirectory(prefix="client3-batch-")
+    with marks:
+        while todo:
+            pool = ProcessPoolExecutor(workers, mp_context=multiprocessing.get_context("spawn"),
+                                       initializer=_worker_start)
+            pending: Dict[Future, Tuple[str, str, str]] = {}  # type: ignore[type-arg]
+            for index, (take, path) in enumerate(todo):
+                mark = os.path.join(marks.name, str(index))
+                pending[pool.submit(run_take, job, take, path, retries, options, "", mark)] = (take, path, mark)
+            todo = []
+            try:
+                while pending:
+                    finished, _ = wait(pending, return_when=FIRST_COMPLETED)
+                    for future in finished:
+                        take, path, mark = pending.pop(future)
+                        try:
+                            yield future.result()
+                        except BrokenProcessPool:
+                            if os.path.exists(mark):
+                                os.remove(mark)
+                                attempts[take] = attempts.get(take, 0) + 1
+                            if attempts.get(take, 0) > retries:
+                                yield Result(take, False, "the worker process ended during the take", 0.0, "",
+                                             attempts[take])
+                            else:
+                                todo.append((take, path))
+            finally:
+                for future in pending:
+                    future.cancel()
+                pool.shutdown(wait=True)
 
 
 def _done(out: str) -> Set[str]:

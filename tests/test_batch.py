@@ -141,6 +141,19 @@ def test_an_application_that_ends_during_a_take_is_started_again(engine, takes, 
     assert all(result.ok for result in results.values()) == (retries == 1)
 
 
+def test_a_worker_process_that_ends_loses_no_take(engine, takes, serial, tmp_path):
+    bad = str(tmp_path / "bad.scene")
+    shutil.copy(takes[0], bad)
+    results = by_take(batch.run(batchjobs.exit_marked, [bad, *takes], **engine))
+    assert set(results) == {bad, *takes}
+    assert {take: results[take].value for take in takes} == serial
+    assert not results[bad].ok
+    if "workers" in engine:
+        assert (results[bad].value, results[bad].attempts) == ("the worker process ended during the take", 2)
+    else:  # Dask gives up on the take itself, after its own number of tries
+        assert results[bad].value.startswith("KilledWorker: ")
+
+
 @pytest.mark.parametrize("name, content, message", [
     ("missing.scene", None, "cannot read the file '{path}' (result code 1003)"),
     ("damaged.scene", b"client3-scene 1\nframes nope\n",
