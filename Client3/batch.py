@@ -40,8 +40,7 @@ from concurrent.futures.process import BrokenProcessPool
 from typing import Any, Callable, Dict, Iterable, Iterator, List, NamedTuple, Optional, Sequence, Set, Tuple
 
 import Client3
-from Client3.host import executable
-from Client3.testing import _port, stop
+from Client3.host import executable, listening_port, stop
 
 Job = Callable[[Any, str], Any]
 IMPORTED = (".csv", ".c3d")  # opened with ImportFile; anything else is a scene file for LoadFile
@@ -74,7 +73,7 @@ class _Application:
             **_own_session())
         _started.append(self)
         assert self.process.stdout is not None
-        self.client = Client3.connect("127.0.0.1", _port(self.process.stdout.readline()))
+        self.client = Client3.connect("127.0.0.1", listening_port(self.process.stdout.readline()))
 
     def run(self, job: Job, take: str, path: str) -> Tuple[bool, Any, bool]:
         """(ok, the job's value or the error text, whether the application was lost meanwhile)."""

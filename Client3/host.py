@@ -10,6 +10,7 @@ import sysconfig
 from typing import List, Optional
 
 PROGRAM = "client3-host"
+STOP_SECONDS = 10
 
 
 def executable() -> str:
@@ -22,6 +23,26 @@ def executable() -> str:
     if found is None:
         raise FileNotFoundError(f"{PROGRAM} is not installed; install this package with pip")
     return found
+
+
+def listening_port(first_line: str) -> int:
+    """The port in the application's first line of output, "listening on HOST:PORT"."""
+    prefix = "listening on "
+    if not first_line.startswith(prefix):
+        raise RuntimeError(f"the application did not start: {first_line!r}")
+    return int(first_line.rsplit(":", 1)[1])
+
+
+def stop(process: "subprocess.Popen[str]") -> None:
+    """Stops an application as SIGTERM does (killed if it has not ended within STOP_SECONDS)."""
+    process.terminate()
+    try:
+        process.wait(STOP_SECONDS)
+    except subprocess.TimeoutExpired:
+        process.kill()
+        process.wait()
+    if process.stdout is not None:
+        process.stdout.close()
 
 
 def main(argv: Optional[List[str]] = None) -> int:

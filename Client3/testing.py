@@ -16,10 +16,9 @@ from contextlib import contextmanager
 from typing import Any, Iterator, NamedTuple, Optional, Sequence
 
 import Client3
-from Client3.host import executable
+from Client3.host import executable, listening_port, stop
 
 STARTUP_SECONDS = 30
-STOP_SECONDS = 10
 
 
 class Host(NamedTuple):
@@ -28,13 +27,6 @@ class Host(NamedTuple):
     address: str
     port: int
     process: "subprocess.Popen[str]"
-
-
-def _port(first_line: str) -> int:
-    prefix = "listening on "
-    if not first_line.startswith(prefix):
-        raise RuntimeError(f"the application did not start: {first_line!r}")
-    return int(first_line.rsplit(":", 1)[1])
 
 
 @contextmanager
@@ -51,21 +43,9 @@ def running_host(
     try:
         assert process.stdout is not None
         first = process.stdout.readline()
-        yield Host(address, _port(first), process)
+        yield Host(address, listening_port(first), process)
     finally:
         stop(process)
-
-
-def stop(process: "subprocess.Popen[str]") -> None:
-    """Stops an application as SIGTERM does (killed if it has not ended within STOP_SECONDS)."""
-    process.terminate()
-    try:
-        process.wait(STOP_SECONDS)
-    except subprocess.TimeoutExpired:
-        process.kill()
-        process.wait()
-    if process.stdout is not None:
-        process.stdout.close()
 
 
 @contextmanager
