@@ -97,12 +97,13 @@ def by_take(results):
     return found
 
 
-def marked_processes(marker):
-    """The live processes whose environment carries `marker`: what a batch started under it."""
+def marked_processes(marker, program=""):
+    """The live processes whose environment carries `marker` (what was started under it), those of
+    `program` alone when it is given."""
     found = []
     for process in psutil.process_iter():
         try:
-            if process.environ().get(MARKER) == marker:
+            if process.environ().get(MARKER) == marker and process.name().startswith(program):
                 found.append(process)
         except (psutil.Error, OSError):
             continue
@@ -141,7 +142,9 @@ def test_an_application_that_ends_during_a_take_is_started_again(engine, takes, 
     assert all(result.ok for result in results.values()) == (retries == 1)
 
 
-def test_a_worker_process_that_ends_loses_no_take(engine, takes, serial, tmp_path):
+def test_a_worker_process_that_ends_loses_no_take(engine, takes, serial, tmp_path, monkeypatch):
+    marker = uuid.uuid4().hex
+    monkeypatch.setenv(MARKER, marker)  # seen by the pool's workers (Dask's were started before)
     bad = str(tmp_path / "bad.scene")
     shutil.copy(takes[0], bad)
     results = by_take(batch.run(batchjobs.exit_marked, [bad, *takes], **engine))
@@ -150,6 +153,8 @@ def test_a_worker_process_that_ends_loses_no_take(engine, takes, serial, tmp_pat
     assert not results[bad].ok
     if "workers" in engine:
         assert (results[bad].value, results[bad].attempts) == ("the worker process ended during the take", 2)
+        # The applications of the workers that ended went with them.
+        assert psutil.wait_procs(marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
     else:  # Dask gives up on the take itself, after its own number of tries
         assert results[bad].value.startswith("KilledWorker: ")
 
@@ -202,7 +207,7 @@ def test_the_pools_applications_end_with_the_batch(takes, monkeypatch):
     marker = uuid.uuid4().hex
     monkeypatch.setenv(MARKER, marker)
     assert len(list(batch.run(batchjobs.fix, takes, workers=2))) == TAKES
-    assert psutil.wait_procs(marked_processes(marker), timeout=WAIT)[1] == []
+    assert psutil.wait_procs(marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
 
 
 def test_a_dask_workers_applications_end_with_the_worker(takes, monkeypatch):
@@ -211,8 +216,8 @@ def test_a_dask_workers_applications_end_with_the_worker(takes, monkeypatch):
     with distributed.LocalCluster(n_workers=1, threads_per_worker=2, processes=True, host="127.0.0.1", dashboard_address="127.0.0.1:0") as cluster:
         results = list(batch.run(batchjobs.fix, takes, cluster=cluster.scheduler_address))
         assert len(results) == TAKES
-        assert any(process.name().startswith("client3-host") for process in marked_processes(marker))
-    assert psutil.wait_procs(marked_processes(marker), timeout=WAIT)[1] == []
+        assert marked_processes(marker, "client3-host")
+    assert psutil.wait_procs(marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
 
 
 # --- the command line -------------------------------------------------------------------------------
