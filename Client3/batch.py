@@ -71,9 +71,13 @@ class _Application:
             [executable(), "--port", "0", "--scene", "empty", "--watch-stdin", *options],
             stdin=subprocess.PIPE, stdout=subprocess.PIPE, stderr=subprocess.DEVNULL, text=True,
             **_own_session())
-        _started.append(self)
         assert self.process.stdout is not None
-        self.client = Client3.connect("127.0.0.1", listening_port(self.process.stdout.readline()))
+        try:
+            self.client = Client3.connect("127.0.0.1", listening_port(self.process.stdout.readline()))
+        except BaseException:
+            stop(self.process)
+            raise
+        _started.append(self)
 
     def run(self, job: Job, take: str, path: str) -> Tuple[bool, Any, bool]:
         """(ok, the job's value or the error text, whether the application was lost meanwhile)."""
@@ -145,7 +149,11 @@ def run_take(job: Job, take: str, path: str, retries: int, options: Tuple[str, .
     try:
         while True:
             attempts += 1
-            application = _take_application(options)
+            try:
+                application = _take_application(options)
+            except Exception as error:  # not installed, or it refused its options
+                ok, value = False, f"cannot start the application: {error}"
+                break
             ok, value, lost = application.run(job, take, path)
             if not lost:
                 with _lock:

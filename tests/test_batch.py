@@ -159,6 +159,12 @@ def test_a_worker_process_that_ends_loses_no_take(engine, takes, serial, tmp_pat
         assert results[bad].value.startswith("KilledWorker: ")
 
 
+def test_an_application_that_does_not_start_fails_every_take(engine, takes):
+    results = by_take(batch.run(batchjobs.fix, takes[:2], host_options=["--frames", "0"], **engine))
+    assert [result.value for result in results.values()] == ["cannot start the application: "
+                                                             "the application did not start: ''"] * 2
+
+
 @pytest.mark.parametrize("name, content, message", [
     ("missing.scene", None, "cannot read the file '{path}' (result code 1003)"),
     ("damaged.scene", b"client3-scene 1\nframes nope\n",
