@@ -830,3 +830,19 @@ def test_stop_signal_ends_the_application_with_status_zero(start_host, clients, 
         assert read_frame(idle) is None
     assert host.log().endswith(" info stopped\n")
     assert wait_until(lambda: call(connected, "IsConnected") is False)
+
+
+def test_the_exit_fault_ends_the_application_at_that_commands_nth_request(start_host, clients):
+    host = start_host("--fault", "exit=2@GetFrameCount")
+    client = clients()
+    ok(connect(client, host))
+    assert result(call(client, "GetSubjectNames")) == (m.Success, "OK")  # other commands do not count
+    assert call(client, "GetFrameCount") == 1000
+    assert call(client, "GetFrameCount") == 0  # no reply: the application is gone
+    assert host.process.wait(10) == 3
+
+
+def test_watch_stdin_stops_the_application_at_the_end_of_its_input(start_host):
+    host = start_host("--watch-stdin")  # its standard input is empty
+    assert host.process.wait(10) == 0
+    assert host.log().endswith(" info stopped\n")
