@@ -1,4 +1,5 @@
 // Scenes and files: a new scene, loading and saving scene files.
+#include "host/access.h"
 #include "host/handlers.h"
 #include "host/scenefile.h"
 #include "platform/files.h"
@@ -19,7 +20,8 @@ void NewScene(Context& context, Reader&, Writer&) { context.scene = EmptyScene(c
 void LoadFile(Context& context, Reader& in, Writer&) {
   std::string path(in.Text());
   if (path.empty()) Refuse("a file path cannot be empty");
-  context.scene = LoadScene(path);
+  context.scene = LoadScene(FilePlace(path));
+  context.scene.path = path;
 }
 
 void SaveFile(Context& context, Reader& in, Writer&) {
@@ -27,7 +29,7 @@ void SaveFile(Context& context, Reader& in, Writer&) {
   std::string_view options = in.Text();
   if (path.empty()) Refuse("a file path cannot be empty");
   if (!options.empty()) Refuse("'SaveFile' takes no options: '" + std::string(options) + "'");
-  if (!platform::WriteFileAtomically(path, WriteScene(context.scene))) Refuse("cannot write the file '" + path + "'");
+  if (!platform::WriteFileAtomically(FilePlace(path), WriteScene(context.scene))) Refuse("cannot write the file '" + path + "'");
   context.scene.path = path;
 }
 

@@ -16,6 +16,7 @@
 #include <limits>
 #include <map>
 
+#include "host/access.h"
 #include "host/handlers.h"
 #include "platform/files.h"
 
@@ -562,7 +563,7 @@ void ImportFile(Context& context, Reader& in, Writer&) {
   if (path.empty()) Refuse("a file path cannot be empty");
   Format format = FormatOf(path, formatName);
   std::string bytes;
-  if (!platform::ReadFile(path, bytes, kMaxImport)) Refuse("cannot read the file '" + path + "'");
+  if (!platform::ReadFile(FilePlace(path), bytes, kMaxImport)) Refuse("cannot read the file '" + path + "'");
   Take take = format == Format::Csv ? ReadCsv(bytes) : C3dReader(bytes).Read();
   bytes.clear();
 
@@ -588,7 +589,7 @@ void ExportFile(Context& context, Reader& in, Writer&) {
   Format format = FormatOf(path, formatName);
   Take take = TakeOf(context.scene);
   std::string bytes = format == Format::Csv ? WriteCsv(take) : WriteC3d(take);
-  if (!platform::WriteFileAtomically(path, bytes)) Refuse("cannot write the file '" + path + "'");
+  if (!platform::WriteFileAtomically(FilePlace(path), bytes)) Refuse("cannot write the file '" + path + "'");
 }
 
 constexpr HandlerEntry kHandlers[] = {

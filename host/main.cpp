@@ -1,17 +1,23 @@
 // client3-host: the post-processing application, serving one scene to its clients.
 //
-//   client3-host [--host 127.0.0.1] [--port 8870] [--scene demo|empty|FILE] [--frames 1000] [--watch-stdin]
+//   client3-host [--host 127.0.0.1] [--port 8870] [--scene demo|empty|FILE] [--frames 1000]
+//                [--token SECRET] [--files DIR]... [--max-clients 64] [--max-frame BYTES] [--rate N]
+//                [--watch-stdin]
 //
+// It listens on loopback unless told otherwise, and another address needs an access token (--token,
+// or the environment variable CLIENT3_TOKEN) that every client must present.
 // The first line on standard output is "listening on HOST:PORT" (with --port 0, the port the system
 // picked). The log goes to standard error. SIGINT and SIGTERM stop it cleanly.
 #include <atomic>
 #include <charconv>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <string>
 #include <string_view>
 #include <thread>
 
+#include "host/access.h"
 #include "host/scenefile.h"
 #include "host/server.h"
 #include "host/text.h"
@@ -61,15 +67,33 @@ bool ParseFault(std::string_view fault, Options& options) {
   return false;
 }
 
+// An address that only this machine reaches: "localhost", "::1" or a dotted 127.x.y.z.
+bool IsLoopback(std::string_view host) {
+  if (host == "localhost" || host == "::1") return true;
+  int parts = 0, value = 0;
+  for (std::size_t at = 0; at <= host.size(); ++parts) {
+    std::size_t dot = std::min(host.find('.', at), host.size());
+    if (!ParseInt(host.substr(at, dot - at), value, 0, 255) || (parts == 0 && value != 127)) return false;
+    at = dot + 1;
+  }
+  return parts == 4;
+}
+
 int Usage(const char* problem) {
   if (problem) std::fprintf(stderr, "client3-host: %s\n", problem);
   std::fprintf(problem ? stderr : stdout,
-               "usage: client3-host [--host ADDRESS] [--port N] [--scene demo|empty|FILE] [--frames N]\n"
+               "usage: client3-host [--host ADDRESS] [--port N] [--scene demo|empty|FILE] [--frames N] [--token SECRET]\n"
+               "                    [--files DIR]... [--max-clients N] [--max-frame N] [--rate N]\n"
                "  --host ADDRESS   the address to listen on (default 127.0.0.1)\n"
                "  --port N         the port (default 8870; 0 picks a free one)\n"
                "  --scene SCENE    demo (default), empty, or a scene file\n"
                "  --frames N       frames of the demo and empty scenes, 1 to 1000000 (default 1000)\n"
+               "  --token SECRET   the access token clients must give (default: $CLIENT3_TOKEN; needed\n"
+               "                   for an address other than loopback)\n"
+               "  --files DIR      file commands may use only this directory (repeatable; default: any)\n"
                "  --max-clients N  clients served at once (default 64)\n"
+               "  --max-frame N    the largest request in bytes, 64 to 67108864 (default 67108864)\n"
+               "  --rate N         requests per second served to each client, 0 for no limit (default 50000)\n"
                "  --watch-stdin    stop when standard input reaches its end\n"
                "  --fault FAULT    test only: misbehave as FAULT says (see the reference page)\n");
   return problem ? 2 : 0;
@@ -79,6 +103,8 @@ int Usage(const char* problem) {
 
 int main(int argc, char** argv) {
   Options options;
+  if (const char* token = std::getenv("CLIENT3_TOKEN")) options.token = token;
+  std::vector<std::string> files;
   for (int i = 1; i < argc; ++i) {
     std::string_view option = argv[i];
     if (option == "--help" || option == "-h") return Usage(nullptr);
@@ -88,7 +114,7 @@ int main(int argc, char** argv) {
     }
     if (i + 1 >= argc) return Usage(("option " + std::string(option) + " needs a value").c_str());
     std::string_view value = argv[++i];
-    int maxClients = 0;
+    int maxClients = 0, maxFrame = 0;
     if (option == "--host")
       options.host = value;
     else if (option == "--port") {
@@ -100,12 +126,25 @@ int main(int argc, char** argv) {
     } else if (option == "--max-clients") {
       if (!ParseInt(value, maxClients, 1, 4096)) return Usage("--max-clients takes a number from 1 to 4096");
       options.maxClients = static_cast<std::size_t>(maxClients);
-    } else if (option == "--fault") {
+    } else if (option == "--max-frame") {
+      if (!ParseInt(value, maxFrame, 64, static_cast<int>(client3::protocol::kMaxFrame)))
+        return Usage("--max-frame takes a number from 64 to 67108864");
+      options.maxFrame = static_cast<std::uint32_t>(maxFrame);
+    } else if (option == "--rate") {
+      if (!ParseInt(value, options.rate, 0, 100000000)) return Usage("--rate takes a number from 0 to 100000000");
+    } else if (option == "--token")
+      options.token = value;
+    else if (option == "--files")
+      files.emplace_back(value);
+    else if (option == "--fault") {
       if (!ParseFault(value, options)) return Usage(("unknown fault '" + std::string(value) + "'").c_str());
     } else {
       return Usage(("unknown option " + std::string(option)).c_str());
     }
   }
+  if (options.token.empty() && !IsLoopback(options.host))
+    return Usage(("listening on " + options.host + " needs an access token: give --token or CLIENT3_TOKEN").c_str());
+  if (std::string bad; !ConfineFiles(files, bad)) return Usage(("--files: no directory at '" + bad + "'").c_str());
   Scene scene;
   if (options.scene == "demo")
     scene = DemoScene(options.frames);

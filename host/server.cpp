@@ -9,6 +9,7 @@
 #include <mutex>
 #include <thread>
 
+#include "host/throttle.h"
 #include "platform/net.h"
 
 namespace client3::host {
@@ -26,6 +27,11 @@ namespace {
 
 // A client has this long to say hello after connecting.
 constexpr auto kHelloTime = std::chrono::seconds(10);
+// A frame, once begun, must arrive whole within this time.
+constexpr auto kFrameTime = std::chrono::seconds(30);
+// A payload's buffer starts this large and doubles as its bytes come; a larger one is let go after
+// its request.
+constexpr std::size_t kFirstChunk = 64 << 10;
 
 struct Shared {
   Scene& scene;
@@ -43,14 +49,22 @@ struct Client {
 
 enum class Got { Frame, Closed, TooLarge };
 
-Got ReadFrame(Socket& socket, std::vector<char>& payload, Clock::time_point deadline) {
+// Reads a frame of at most `most` bytes whose first byte comes before `deadline`. Memory is taken as
+// the bytes arrive, so that a length announced and never sent costs nothing.
+Got ReadFrame(Socket& socket, std::vector<char>& payload, std::uint32_t most, Clock::time_point deadline) {
   char header[protocol::kHeaderSize];
   if (socket.ReceiveAll(header, sizeof header, deadline) != Io::Done) return Got::Closed;
   std::uint32_t size;
   std::memcpy(&size, header, sizeof size);
-  if (size == 0 || size > protocol::kMaxFrame) return Got::TooLarge;
-  payload.resize(size);
-  return socket.ReceiveAll(payload.data(), size, deadline) == Io::Done ? Got::Frame : Got::Closed;
+  if (size == 0 || size > most) return Got::TooLarge;
+  deadline = std::min(deadline, Clock::now() + kFrameTime);
+  std::size_t have = 0;
+  payload.resize(std::min<std::size_t>(size, kFirstChunk));
+  while (socket.ReceiveAll(payload.data() + have, payload.size() - have, deadline) == Io::Done) {
+    if ((have = payload.size()) == size) return Got::Frame;
+    payload.resize(std::min<std::size_t>(size, 2 * have));
+  }
+  return Got::Closed;
 }
 
 void Send(Socket& socket, Writer& frame) {
@@ -64,9 +78,18 @@ void SendRefusal(Socket& socket, std::string_view message) {
   Send(socket, frame);
 }
 
-bool Handshake(Socket& socket) {
+// Whether `given` is the token the application wants, compared in a time that does not depend on
+// where the two differ.
+bool TokenMatches(std::string_view given, const std::string& wanted) {
+  if (wanted.empty()) return true;
+  std::size_t difference = given.size() ^ wanted.size();
+  for (std::size_t i = 0; i < given.size(); ++i) difference |= static_cast<unsigned char>(given[i] ^ wanted[i % wanted.size()]);
+  return difference == 0;
+}
+
+bool Handshake(Socket& socket, const Options& options) {
   std::vector<char> payload;
-  if (ReadFrame(socket, payload, Clock::now() + kHelloTime) != Got::Frame) return false;
+  if (ReadFrame(socket, payload, options.maxFrame, Clock::now() + kHelloTime) != Got::Frame) return false;
   try {
     Reader hello(payload.data(), payload.size());
     char magic[sizeof protocol::kMagic];
@@ -75,7 +98,11 @@ bool Handshake(Socket& socket) {
     if (std::memcmp(magic, protocol::kMagic, sizeof magic) != 0) throw DecodeError("");
     auto version = hello.Raw<std::uint16_t>();
     auto count = hello.Raw<std::uint16_t>();
-    hello.RawText();  // the access token, for hosts that ask for one
+    if (!TokenMatches(hello.RawText(), options.token)) {
+      LogLine("warning", "a client was refused: it did not give the access token");
+      SendRefusal(socket, "the application needs its access token, and the client did not give it");
+      return false;
+    }
     if (version != protocol::kVersion || count != protocol::kCommandCount) {
       SendRefusal(socket, "this application speaks version " + std::to_string(protocol::kVersion) + " of the protocol with " +
                               std::to_string(protocol::kCommandCount) + " commands");
@@ -158,14 +185,17 @@ void ServeClient(Shared& shared, Client& client) {
   Context context{shared.scene, language, shared.options.faults};
   std::vector<char> payload;
   Writer reply;
-  if (Handshake(socket)) {
+  Throttle throttle(shared.options.rate);
+  if (Handshake(socket, shared.options)) {
     for (;;) {
-      Got got = ReadFrame(socket, payload, Clock::time_point::max());
+      if (payload.capacity() > 16 * kFirstChunk) std::vector<char>().swap(payload);
+      Got got = ReadFrame(socket, payload, shared.options.maxFrame, Clock::time_point::max());
       if (got == Got::TooLarge) {
-        SendRefusal(socket, "a frame may hold at most " + std::to_string(protocol::kMaxFrame) + " bytes");
+        SendRefusal(socket, "a frame may hold at most " + std::to_string(shared.options.maxFrame) + " bytes");
         break;
       }
       if (got == Got::Closed) break;
+      throttle.Wait();
       std::uint32_t requestId;
       std::uint16_t command;
       Reader in(payload.data(), payload.size());

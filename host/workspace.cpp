@@ -8,6 +8,7 @@
 // components: `..`, separators and links are refused, so that nothing reaches outside it.
 #include <algorithm>
 
+#include "host/access.h"
 #include "host/handlers.h"
 #include "platform/files.h"
 
@@ -52,7 +53,7 @@ std::string Join(const std::string& directory, std::string_view name) {
 // The absolute form of an existing directory named by the user; refused when there is none.
 std::string ExistingDirectory(const std::string& path) {
   if (path.empty()) Refuse("a directory path cannot be empty");
-  std::string full = platform::FullPath(path);
+  std::string full = platform::FullPath(FilePlace(path));
   if (full.empty() || platform::KindOf(full) != FileKind::Directory) Refuse("no directory at '" + path + "'");
   return full;
 }
@@ -188,7 +189,7 @@ void DatabaseSetCurrent(Context&, Reader& in, Writer&) {
       w = Workspace{std::move(w.scriptPath), {}, {}, {}};
       return;
     }
-    std::string full = platform::FullPath(path);
+    std::string full = platform::FullPath(FilePlace(path));
     if (full.empty() || !IsDatabase(full)) Refuse("'" + path + "' is not a capture database");
     w.database = full, w.session.clear(), w.take.clear();
   } else if (item == "Session") {

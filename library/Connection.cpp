@@ -2,6 +2,7 @@
 #include "library/Connection.h"
 
 #include <charconv>
+#include <cstdlib>
 #include <cstring>
 
 namespace ZarvoSDKClientCPP {
@@ -43,14 +44,26 @@ ResultCode::Enum Known(std::int32_t code) {
   }
 }
 
-// "host?timeout=MS&connect=MS": the host name and the two time limits.
+// "host?timeout=MS&connect=MS&token=TEXT": the host name, the two time limits and the access token
+// (by default the environment variable CLIENT3_TOKEN, else none).
 struct Address {
   std::string host = "127.0.0.1";
   std::chrono::milliseconds connect = kConnectTimeout;
   std::chrono::milliseconds reply = kReplyTimeout;
+  std::string token;
 };
 
+// A whole non-negative number of milliseconds.
+bool ParseMilliseconds(std::string_view text, std::chrono::milliseconds& out) {
+  long long ms = -1;
+  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), ms);
+  if (text.empty() || error != std::errc() || end != text.data() + text.size() || ms < 0) return false;
+  out = std::chrono::milliseconds(ms);
+  return true;
+}
+
 bool ParseAddress(std::string const& text, Address& out) {
+  if (const char* token = std::getenv("CLIENT3_TOKEN")) out.token = token;
   std::size_t query = text.find('?');
   std::string host = text.substr(0, query);
   if (!host.empty()) out.host = host;
@@ -59,19 +72,12 @@ bool ParseAddress(std::string const& text, Address& out) {
     std::size_t next = text.find('&', query + 1);
     std::string option = text.substr(query + 1, next == std::string::npos ? std::string::npos : next - query - 1);
     std::size_t equals = option.find('=');
-    long long ms = -1;
-    if (equals != std::string::npos) {
-      const char* first = option.data() + equals + 1;
-      const char* last = option.data() + option.size();
-      auto [end, error] = std::from_chars(first, last, ms);
-      if (error != std::errc() || end != last || ms < 0) return false;
-    }
+    if (equals == std::string::npos) return false;
     std::string key = option.substr(0, equals);
-    if (key == "timeout")
-      out.reply = std::chrono::milliseconds(ms);
-    else if (key == "connect")
-      out.connect = std::chrono::milliseconds(ms);
-    else
+    std::string_view value = std::string_view(option).substr(equals + 1);
+    if (key == "token")
+      out.token = value;
+    else if (key == "timeout" ? !ParseMilliseconds(value, out.reply) : key == "connect" ? !ParseMilliseconds(value, out.connect) : true)
       return false;
     query = next;
   }
@@ -159,7 +165,7 @@ ResultCode::Enum ClientConnection::Open(std::string const& text, int port, std::
   socket_.Close();
   Address address;
   if (!ParseAddress(text, address)) {
-    message = "'" + text + "' is not an address of the form host?timeout=MS&connect=MS";
+    message = "'" + text + "' is not an address of the form host?timeout=MS&connect=MS&token=TEXT";
     return ResultCode::NotConnected;
   }
   if (port <= 0) port = kDefaultPort;
@@ -172,7 +178,7 @@ ResultCode::Enum ClientConnection::Open(std::string const& text, int port, std::
   hello.Append(kMagic, sizeof kMagic);
   hello.Raw(kVersion);
   hello.Raw(static_cast<std::uint16_t>(kCommandCount));
-  hello.RawText("");
+  hello.RawText(address.token);
   std::string_view frame = hello.Finish();
   if (!socket_.SendAll(frame.data(), frame.size())) return Lost();
   ResultCode::Enum code = Receive(Clock::now() + address.connect);
