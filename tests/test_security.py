@@ -1,0 +1,291 @@
+"""The application's defences against real hosts: the access token, the addresses it listens on only
+with one, the directories file commands may use, its limits on frame size and request rate, and a log
+in which clients cannot forge lines."""
+import os
+import socket
+import struct
+import subprocess
+import time
+import types
+
+import _Client3 as m
+import pytest
+
+import companion
+import hostproc
+from appclient import Client
+
+TOKEN = "correct horse"
+NEEDS_TOKEN = "the application needs its access token, and the client did not give it"
+
+
+def with_options(host, options):
+    """The host as appclient.Client connects to it, with options after its address."""
+    return types.SimpleNamespace(address=host.address + ("?" + options if options else ""), port=host.port)
+
+
+def connect(host, options=""):
+    """The result code and message of a new client's Connect, whether it is then connected, and the
+    frame count it reads."""
+    client = companion.classes["ZarvoPelluxPostClient"]()
+    record = m.ZarvoPelluxPostClient_Connect(client, with_options(host, options).address, host.port)
+    seen = (m.Output_Result_Result_get(record), m.SafeString_Value(m.Output_Result_ResultString_get(record)),
+            m.ZarvoPelluxPostClient_IsConnected(client), m.ZarvoPelluxPostClient_GetFrameCount(client))
+    m.delete_ZarvoPelluxPostClient(client)
+    return seen
+
+
+def frame(payload):
+    return struct.pack("<I", len(payload)) + payload
+
+
+def receive_all(sock):
+    """Everything the host sends until it closes the connection."""
+    received = b""
+    while True:
+        chunk = sock.recv(65536)
+        if not chunk:
+            return received
+        received += chunk
+
+
+# ---- The access token ---------------------------------------------------------------------------------
+
+
+@pytest.mark.parametrize("host_from_env, options, client_env, accepted", [
+    (False, "", None, False),
+    (False, "token=", None, False),
+    (False, "token=correct hors", None, False),
+    (False, "token=correct horse!", None, False),
+    (False, "token=Correct horse", None, False),
+    (False, "token=correct horse", None, True),
+    (False, "timeout=2000&token=correct horse&connect=2000", None, True),
+    (False, "", TOKEN, True),                         # the client's token from its environment
+    (False, "token=wrong", TOKEN, False),             # the address comes before the environment
+    (True, "token=correct horse", None, True),        # the host's token from its environment
+    (True, "token=wrong", None, False),
+])
+def test_access_token(start_host, monkeypatch, host_from_env, options, client_env, accepted):
+    monkeypatch.delenv("CLIENT3_TOKEN", raising=False)
+    if host_from_env:
+        monkeypatch.setenv("CLIENT3_TOKEN", TOKEN)
+        host = start_host()
+        monkeypatch.delenv("CLIENT3_TOKEN")
+    else:
+        host = start_host("--token", TOKEN)
+    if client_env:
+        monkeypatch.setenv("CLIENT3_TOKEN", client_env)
+    if accepted:
+        assert connect(host, options) == (m.Success, "OK", True, 1000)
+    else:
+        assert connect(host, options) == (m.ApplicationError, NEEDS_TOKEN, False, 0)
+        assert " warning a client was refused: it did not give the access token\n" in host.log()
+
+
+def test_host_without_a_token_takes_any(host, monkeypatch):
+    monkeypatch.setenv("CLIENT3_TOKEN", "anything")
+    assert connect(host, "token=whatever") == (m.Success, "OK", True, 1000)
+
+
+def test_no_command_runs_before_the_token_is_checked(start_host):
+    host = start_host("--token", TOKEN)
+    app = Client(with_options(host, "token=" + TOKEN))
+    commands = app.GetCommandList()
+    name = b"Taken over"
+    hello = b"HZPP1" + struct.pack("<HHI", 1, len(commands), 5) + b"wrong"
+    rename = b"Q" + struct.pack("<IH", 1, commands.index("SetSceneName")) + b"\x01" + struct.pack("<I", len(name)) + name
+    with socket.create_connection((host.address, host.port), timeout=5) as sock:
+        # The hello and a request in one write: the request must never run.
+        sock.sendall(frame(hello) + frame(rename))
+        assert receive_all(sock) == frame(b"E" + struct.pack("<I", len(NEEDS_TOKEN)) + NEEDS_TOKEN.encode())
+    assert app.GetSceneName()[0] == "Demo"
+    app.close()
+
+
+# ---- Addresses to listen on ---------------------------------------------------------------------------------
+
+
+def run_host(*options, token=None):
+    """Starts the application with `options` and CLIENT3_TOKEN set to `token`; returns the process and
+    its first line (the process has ended when the line is empty)."""
+    env = {k: v for k, v in os.environ.items() if k != "CLIENT3_TOKEN"}
+    if token:
+        env["CLIENT3_TOKEN"] = token
+    process = subprocess.Popen([hostproc.executable(), "--port", "0", *options], env=env, stdin=subprocess.DEVNULL,
+                               stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+    return process, hostproc._first_line(process.stdout, time.monotonic() + 10)
+
+
+def stopped(process):
+    """Stops a process started by run_host; returns its exit status and standard error."""
+    if process.poll() is None:
+        process.terminate()
+    _, err = process.communicate(timeout=10)
+    return process.returncode, err.decode()
+
+
+@pytest.mark.parametrize("where", ["0.0.0.0", "::", "10.1.2.3", "127.1", "127.0.0.1.", "127.a.b.c", "example.invalid"])
+def test_listening_beyond_loopback_needs_a_token(where):
+    process, line = run_host("--host", where)
+    assert line == ""
+    status, err = stopped(process)
+    assert status == 2
+    assert err.startswith(f"client3-host: listening on {where} needs an access token: give --token or CLIENT3_TOKEN\n")
+
+
+@pytest.mark.parametrize("where, options, token", [
+    ("127.0.0.2", (), None),
+    ("localhost", (), None),
+    ("0.0.0.0", ("--token", TOKEN), None),
+    ("0.0.0.0", (), TOKEN),
+])
+def test_loopback_or_a_token_lets_it_listen(where, options, token):
+    process, line = run_host("--host", where, *options, token=token)
+    try:
+        assert line.startswith(f"listening on {where}:")
+        port = int(line.rsplit(":", 1)[1])
+        reached = "127.0.0.2" if where == "127.0.0.2" else "127.0.0.1"
+        assert connect(types.SimpleNamespace(address=reached, port=port), f"token={TOKEN}")[0] == m.Success
+    finally:
+        assert stopped(process)[0] == 0
+
+
+# ---- Directories for file commands ----------------------------------------------------------------------
+
+
+@pytest.fixture
+def places(tmp_path):
+    """allowed/ (named with --files) holding sub/, a link `exit` to outside/ and a link `secret` to
+    outside/secret; outside/ holding a file and a capture database; allowed2/ beside them."""
+    allowed, outside = tmp_path / "allowed", tmp_path / "outside"
+    (allowed / "sub").mkdir(parents=True)
+    (tmp_path / "allowed2").mkdir()
+    (outside / "db").mkdir(parents=True)
+    (outside / "db" / "client3.database").write_text("client3-database 1\n")
+    (outside / "secret").write_text("not a scene")
+    os.symlink(outside, allowed / "exit")
+    os.symlink(outside / "secret", allowed / "secret")
+    return allowed, outside
+
+
+def outside_contents(outside):
+    return sorted(str(p.relative_to(outside)) for p in outside.rglob("*"))
+
+
+ALLOWED = [
+    ("SaveFile", ("{a}/scene", "")),
+    ("SaveFile", ("{a}/sub/../scene", "")),
+    ("SaveFile", ("{a}/sub/scene", "")),
+    ("ExportFile", ("{a}/take.csv", "csv")),
+    ("AddScriptPath", ("{a}/sub",)),
+    ("DatabaseCreate", ("{a}", "db")),
+]
+
+REFUSED = [
+    ("SaveFile", ("{a}/../outside/scene", "")),
+    ("SaveFile", ("{a}/exit/scene", "")),
+    ("SaveFile", ("{a}/missing/scene", "")),
+    ("SaveFile", ("{a}/missing/../../outside/scene", "")),
+    ("SaveFile", ("{a}/..", "")),
+    ("SaveFile", ("{o}/scene", "")),
+    ("SaveFile", ("{a}2/scene", "")),  # a sibling whose name begins with the named one
+    ("SaveFile", ("scene-in-the-working-directory", "")),
+    ("ExportFile", ("{a}/exit/take.csv", "csv")),
+    ("LoadFile", ("{o}/secret",)),
+    ("LoadFile", ("{a}/secret",)),
+    ("LoadFile", ("{a}/exit/secret",)),
+    ("ImportFile", ("{a}/exit/secret", "csv", True)),
+    ("AddScriptPath", ("{a}/exit",)),
+    ("DatabaseCreate", ("{a}/exit", "db2")),
+    ("DatabaseSetCurrent", ("Database", "{a}/exit/db")),
+]
+
+
+def filled(args, allowed, outside):
+    return [a.format(a=allowed, o=outside) if isinstance(a, str) else a for a in args]
+
+
+@pytest.mark.skipif(not hasattr(os, "symlink"), reason="no symbolic links")
+@pytest.mark.parametrize("operation, args", ALLOWED, ids=[f"{o} {' '.join(map(str, a))}" for o, a in ALLOWED])
+def test_file_commands_inside_the_named_directories(start_host, places, operation, args):
+    allowed, outside = places
+    app = Client(start_host("--files", str(allowed), "--frames", "20"))
+    before = outside_contents(outside)
+    getattr(app, operation)(*filled(args, allowed, outside))
+    assert outside_contents(outside) == before
+    app.close()
+
+
+@pytest.mark.skipif(not hasattr(os, "symlink"), reason="no symbolic links")
+@pytest.mark.parametrize("operation, args", REFUSED, ids=[f"{o} {' '.join(map(str, a))}" for o, a in REFUSED])
+def test_file_commands_outside_the_named_directories_are_refused(start_host, places, operation, args):
+    allowed, outside = places
+    app = Client(start_host("--files", str(allowed), "--frames", "20"))
+    before = outside_contents(outside), app.GetSceneName()
+    args = filled(args, allowed, outside)
+    path = args[1] if operation == "DatabaseSetCurrent" else args[0]
+    assert app.refusal(operation, *args) == (m.ApplicationError, f"'{path}' is not inside the directories the application may use")
+    assert (outside_contents(outside), app.GetSceneName()) == before
+    assert app.DatabaseGetCurrent("Database") == ""
+    app.close()
+
+
+def test_files_option_names_an_existing_directory(tmp_path):
+    process, line = run_host("--files", str(tmp_path / "missing"))
+    assert line == ""
+    status, err = stopped(process)
+    assert status == 2
+    assert err.startswith(f"client3-host: --files: no directory at '{tmp_path / 'missing'}'\n")
+
+
+# ---- Limits ---------------------------------------------------------------------------------------------
+
+
+def test_a_request_over_the_frame_limit_is_refused(start_host):
+    host = start_host("--max-frame", "4096")
+    app = Client(host)
+    app.SetTrajectoryAtFrame("Alice", "LANK", 5, 1.0, 2.0, 3.0, True)
+    xyz = companion.classes["vectord"]([1.0] * 1000)
+    seen = companion.classes["vectorb"]([True] * 1000)
+    assert app.refusal("SetTrajectory", "Alice", "LANK", xyz, xyz, xyz, seen) == (
+        m.ApplicationError, "a frame may hold at most 4096 bytes")
+    assert app.IsConnected() is False
+    again = Client(host)
+    assert again.GetTrajectoryAtFrame("Alice", "LANK", 5) == (1.0, 2.0, 3.0, True)
+    again.close()
+
+
+def test_a_fast_client_is_slowed_and_loses_nothing(start_host):
+    app = Client(start_host("--rate", "20"))
+    app.GetTrajectoryAtFrame("Alice", "LANK", 1)  # the command descriptions the test client reads once
+    started = time.monotonic()
+    for f in range(1, 61):
+        app.SetTrajectoryAtFrame("Alice", "LANK", f, float(f), -float(f), 0.5, True)
+    # 60 requests at 20 a second after a burst of at most 20: two seconds at the least.
+    assert time.monotonic() - started >= 2.0
+    x, y, z, e = app.GetTrajectory("Alice", "LANK")
+    assert (x[:60], y[:60]) == ([float(f) for f in range(1, 61)], [-float(f) for f in range(1, 61)])
+    app.close()
+
+
+# ---- The log ---------------------------------------------------------------------------------------------
+
+
+@pytest.mark.parametrize("sent, logged", [
+    ("line\n2026-01-01 00:00:00 error forged", "line\\n2026-01-01 00:00:00 error forged"),
+    ("back\roverwritten", "back\\roverwritten"),
+    ("escape \x1b[2J and bell \x07", "escape ?[2J and bell ?"),
+    ("tab\tand delete\x7f", "tab?and delete?"),
+])
+def test_client_text_cannot_forge_log_lines(client_app, sent, logged):
+    app, host = client_app
+    app.Log("info", sent)
+    assert host.log().splitlines()[-1].split(" info ", 1)[1] == logged
+
+
+@pytest.fixture
+def client_app(start_host):
+    host = start_host()
+    app = Client(host)
+    yield app, host
+    app.close()
