@@ -1,0 +1,204 @@
+"""A network fuzzer against a running host: random, mutated, truncated, oversized and slowly dripped
+frames, half-closed connections, and thousands of connections opened and dropped. Throughout, the
+host keeps serving a well-behaved client, and its memory and thread count stay bounded. Seeded, and
+bounded in rounds and time."""
+import os
+import random
+import socket
+import struct
+import time
+
+import _Client3 as m
+import pytest
+
+from appclient import Client
+from conftest import needs_plain_allocator
+from test_host import MAX_FRAME, frame, hello, read_frame, refusal, reply, request, text_value, wait_until
+
+SEED = 20261123
+ROUNDS = 1000
+SECONDS = 120     # the whole fuzz, at most
+DRIPPERS = 12     # connections that send their requests one byte a round
+HOLDERS = 12      # connections that announce the largest frame and send only part of it
+HELD_BYTES = 256 << 10
+BURST = 40        # connections opened and dropped at once
+
+def host_status(host):
+    """The host's resident memory in KiB and its thread count, from /proc."""
+    with open(f"/proc/{host.process.pid}/status") as status:
+        fields = dict(line.split(":", 1) for line in status)
+    return int(fields["VmRSS"].split()[0]), int(fields["Threads"])
+
+def connection(host):
+    sock = socket.create_connection((host.address, host.port), timeout=5)
+    return sock
+
+def shaken(host, commands):
+    sock = connection(host)
+    sock.sendall(hello(len(commands)))
+    assert read_frame(sock)[:1] == b"H"
+    return sock
+
+def reset_and_close(sock):
+    sock.setsockopt(socket.SOL_SOCKET, socket.SO_LINGER, struct.pack("ii", 1, 0))
+    sock.close()
+
+class Fuzzer:
+    """One kind of bad peer per method; `rng` chooses what each sends."""
+
+    def __init__(self, host, commands, rng):
+        self.host, self.commands, self.rng = host, commands, rng
+        self.connections = 0
+        number = commands.index
+        # Requests of commands that only read the scene, for mutation.
+        self.requests = [
+            request(0, number("GetMarkerNames"), text_value("Alice")),
+            request(0, number("GetTrajectoryAtFrame"), text_value("Bob"), text_value("LANK"), b"\x02" + struct.pack("<i", 9)),
+            request(0, number("GetTrajectory"), text_value("Alice"), text_value("C7")),
+            request(0, number("GetSubjectNames")),
+        ]
+
+    def open(self, shake=True):
+        self.connections += 1
+        return shaken(self.host, self.commands) if shake else connection(self.host)
+
+    def bytes(self, most):
+        return bytes(self.rng.randrange(256) for _ in range(self.rng.randrange(1, most)))
+
+    def garbage_before_hello(self):
+        sock = self.open(shake=False)
+        sock.sendall(self.bytes(200))
+        reset_and_close(sock) if self.rng.random() < 0.5 else sock.close()
+
+    def frame_that_is_no_request(self):
+        with self.open() as sock:
+            sock.sendall(frame(bytes([self.rng.choice(b"HRE\x00\xff")]) + self.bytes(100)))
+            assert refusal(read_frame(sock)) == "a frame that is not a request"
+            assert read_frame(sock) is None
+
+    def mutated_request(self):
+        number = self.rng.randrange(1, 1 << 31)
+        payload = bytearray(self.rng.choice(self.requests)[4:])
+        payload[1:5] = struct.pack("<I", number)
+        how = self.rng.randrange(3)
+        if how == 0 and len(payload) > 7:
+            payload[self.rng.randrange(7, len(payload))] ^= 1 << self.rng.randrange(8)
+        elif how == 1 and len(payload) > 7:
+            del payload[self.rng.randrange(7, len(payload)):]
+        else:
+            payload += self.bytes(40)
+        with self.open() as sock:
+            sock.sendall(frame(bytes(payload)))
+            # Its message may quote the mutated text, which need not be UTF-8.
+            answer = read_frame(sock)
+            assert answer[:1] == b"R"
+            got_number, code = struct.unpack_from("<Ii", answer, 1)
+            assert got_number == number
+            assert code in (m.Success, m.ApplicationError, m.InvalidFrameNumber)
+            sock.sendall(request(number + 1, self.commands.index("GetFrameCount")))
+            assert reply(read_frame(sock))[:2] == (number + 1, m.Success)
+
+    def unknown_command(self):
+        command = self.rng.randrange(len(self.commands), 1 << 16)
+        with self.open() as sock:
+            sock.sendall(request(5, command, self.bytes(60)))
+            assert reply(read_frame(sock)) == (5, m.ApplicationError, f"no command number {command}")
+
+    def truncated(self):
+        sent = self.rng.choice(self.requests)
+        sock = self.open()
+        sock.sendall(sent[:self.rng.randrange(1, len(sent))])
+        reset_and_close(sock) if self.rng.random() < 0.5 else sock.close()
+
+    def oversized(self):
+        size = self.rng.choice([0, MAX_FRAME + 1, self.rng.randrange(MAX_FRAME + 1, 1 << 32)])
+        with self.open() as sock:
+            sock.sendall(struct.pack("<I", size) + self.bytes(100))
+            assert refusal(read_frame(sock)) == f"a frame may hold at most {MAX_FRAME} bytes"
+            assert read_frame(sock) is None
+
+    def half_closed(self):
+        with self.open() as sock:
+            sock.sendall(request(3, self.commands.index("GetMarkerNames"), text_value("Bob")))
+            sock.shutdown(socket.SHUT_WR)
+            assert reply(read_frame(sock)) == (3, m.Success, "")
+            assert read_frame(sock) is None
+
+    def burst(self):
+        held = [self.open(shake=False) for _ in range(BURST)]
+        for i, sock in enumerate(held):
+            if i % 2:
+                sock.sendall(hello(len(self.commands))[:self.rng.randrange(1, 12)])
+            reset_and_close(sock) if i % 3 == 0 else sock.close()
+
+    KINDS = ["garbage_before_hello", "frame_that_is_no_request", "mutated_request", "unknown_command", "truncated",
+             "oversized", "half_closed", "burst"]
+
+class Dripper:
+    """A connection that sends requests one byte a round, and reads each reply once it is all sent."""
+
+    def __init__(self, sock, commands):
+        self.sock, self.command = sock, commands.index("GetMarkerNames")
+        self.number, self.left, self.answered = 0, b"", 0
+
+    def drip(self):
+        if not self.left:
+            self.number += 1
+            self.left = request(self.number, self.command, text_value("Alice"))
+        self.sock.sendall(self.left[:1])
+        self.left = self.left[1:]
+        if not self.left:
+            assert reply(read_frame(self.sock)) == (self.number, m.Success, "")
+            self.answered += 1
+
+@pytest.mark.skipif(not os.path.exists("/proc/self/status"), reason="needs /proc to read the host's memory and threads")
+@needs_plain_allocator
+def test_host_survives_the_network_fuzzer(start_host):
+    host = start_host()
+    well = Client(host)
+    commands = well.GetCommandList()
+    markers = well.GetMarkerNames("Alice")
+    rss_before, threads_before = host_status(host)
+    rng = random.Random(SEED)
+    fuzz = Fuzzer(host, commands, rng)
+    drippers = [Dripper(fuzz.open(), commands) for _ in range(DRIPPERS)]
+    for i, dripper in enumerate(drippers):  # staggered, so that their frames end in different rounds
+        for _ in range(i):
+            dripper.drip()
+    holders = [fuzz.open() for _ in range(HOLDERS)]
+    for sock in holders:
+        sock.sendall(struct.pack("<I", MAX_FRAME) + b"Q" + bytes(HELD_BYTES))
+    deadline = time.monotonic() + SECONDS
+    rss_most, threads_most = 0, 0
+    for turn in range(1, ROUNDS + 1):
+        assert time.monotonic() < deadline, f"the fuzz took longer than {SECONDS} s"
+        getattr(fuzz, rng.choice(Fuzzer.KINDS))()
+        for dripper in drippers:
+            dripper.drip()
+        if turn % 20 == 0:
+            # The well-behaved client is served, and sees its own writes.
+            well.SetTrajectoryAtFrame("Bob", "RANK", turn, float(turn), 0.0, 0.0, True)
+            assert well.GetTrajectoryAtFrame("Bob", "RANK", turn) == (float(turn), 0.0, 0.0, True)
+            rss, threads = host_status(host)
+            rss_most, threads_most = max(rss_most, rss), max(threads_most, threads)
+
+    assert sum(dripper.answered for dripper in drippers) >= DRIPPERS * (ROUNDS // 25)
+    for dripper in drippers:
+        dripper.sock.close()
+    for sock in holders:
+        sock.close()
+
+    assert fuzz.connections > 2000
+    # A thread for each client, at most 64 of them (the default limit) besides the main thread; none
+    # left once they are gone.
+    assert threads_most <= 64 + 1
+    assert wait_until(lambda: host_status(host)[1] <= threads_before + 1, seconds=10)
+    # Frames announced at the largest size cost only the bytes that came, not 64 MiB each.
+    assert rss_most - rss_before < 64 << 10
+    assert well.GetMarkerNames("Alice") == markers
+    x = well.GetTrajectory("Bob", "RANK")[0]
+    assert [x[turn - 1] for turn in range(20, ROUNDS + 1, 20)] == [float(t) for t in range(20, ROUNDS + 1, 20)]
+    fresh = Client(host)
+    assert fresh.GetFrameCount() == 1000
+    fresh.close()
+    well.close()
