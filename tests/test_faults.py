@@ -1,0 +1,124 @@
+"""Processes that die at the worst moment: the host killed while a request waits for its reply, and a
+client or the host killed while a scene is being saved. Nothing hangs, a restarted host is reached
+again, and a scene file is always the old one or the new one, never a mixture."""
+import os
+import signal
+import subprocess
+import sys
+import time
+
+import _Client3 as m
+import pytest
+
+import companion
+from appclient import Client
+
+# Long enough a take that saving it takes a good part of a second.
+FRAMES = "40000"
+
+
+def kill_later(pid, seconds):
+    """A process that kills `pid` after `seconds` (the calling thread may be blocked in the module)."""
+    code = f"import os, signal, time; time.sleep({seconds}); os.kill({pid}, signal.SIGKILL)"
+    return subprocess.Popen([sys.executable, "-c", code])
+
+
+def test_host_killed_mid_request_then_restarted(start_host):
+    host = start_host("--fault", "delay=5000@GetTrajectory")
+    client = companion.classes["ZarvoPelluxPostClient"]()
+    address = host.address + "?timeout=20000"
+    assert m.Output_Result_Result_get(m.ZarvoPelluxPostClient_Connect(client, address, host.port)) == m.Success
+    killer = kill_later(host.process.pid, 0.5)
+    record = m.ZarvoPelluxPostClient_GetTrajectory(client, "Alice", "LANK")
+    # Seen gone when the connection broke, not when the reply timeout ran out (RequestTimedOut).
+    assert m.Output_Result_Result_get(record) == m.NotConnected
+    assert m.ZarvoPelluxPostClient_IsConnected(client) is False
+    assert killer.wait(10) == 0
+    assert host.process.wait(10) == -signal.SIGKILL
+
+    again = start_host("--port", str(host.port))
+    assert again.port == host.port
+    assert m.Output_Result_Result_get(m.ZarvoPelluxPostClient_Connect(client, address, again.port)) == m.Success
+    assert m.ZarvoPelluxPostClient_GetFrameCount(client) == 1000
+    m.delete_ZarvoPelluxPostClient(client)
+
+
+SAVER = """
+import sys
+sys.path.insert(0, {tests!r})
+import companion
+companion.register()
+from appclient import Client
+import types
+client = Client(types.SimpleNamespace(address="127.0.0.1", port={port}))
+print("ready", flush=True)
+client.SetSceneName({name!r})
+client.SaveFile({path!r}, "")
+print("saved", flush=True)
+"""
+
+
+@pytest.mark.parametrize("delay", [0.1, 0.4])
+def test_client_killed_mid_save(start_host, tmp_path, delay):
+    host = start_host("--frames", FRAMES)
+    app = Client(host)
+    files = tmp_path / "files"
+    files.mkdir()
+    path, reference = files / "take.scene", files / "reference.scene"
+    app.SaveFile(str(path), "")
+    old = path.read_bytes()
+    saver = subprocess.Popen([sys.executable, "-c", SAVER.format(tests=os.path.dirname(companion.__file__),
+                                                                  port=host.port, name="Saved by a client", path=str(path))],
+                             stdout=subprocess.PIPE, text=True)
+    assert saver.stdout.readline() == "ready\n"
+    time.sleep(delay)
+    saver.kill()
+    saver.communicate(timeout=30)
+    # The next command waits for the saver's to end: the host finishes what it began.
+    app.SaveFile(str(reference), "")
+    assert path.read_bytes() in (old, reference.read_bytes())
+    assert sorted(p.name for p in files.iterdir()) == ["reference.scene", "take.scene"]
+    app.close()
+
+
+WATCHER = """
+import os, signal, sys, time
+pid, folder = int(sys.argv[1]), sys.argv[2]
+def state():
+    try:
+        return sorted((e.name, e.stat().st_size, e.stat().st_mtime_ns) for e in os.scandir(folder))
+    except FileNotFoundError:
+        return None
+first = state()
+print("watching", flush=True)
+deadline = time.monotonic() + 30
+while state() == first and time.monotonic() < deadline:
+    pass
+os.kill(pid, signal.SIGKILL)
+"""
+
+
+def test_host_killed_as_it_begins_to_write(start_host, tmp_path):
+    host = start_host("--frames", FRAMES)
+    app = Client(host)
+    files = tmp_path / "files"
+    files.mkdir()
+    path, reference = files / "take.scene", files / "reference.scene"
+    app.SaveFile(str(path), "")
+    old = path.read_bytes()
+    app.SetSceneName("Saved again")
+    app.SaveFile(str(reference), "")
+    new = reference.read_bytes()
+    reference.unlink()
+    # Killed at the first change in the folder, whatever the host writes there first.
+    killer = subprocess.Popen([sys.executable, "-c", WATCHER, str(host.process.pid), str(files)],
+                              stdout=subprocess.PIPE, text=True)
+    assert killer.stdout.readline() == "watching\n"
+    assert app.refusal("SaveFile", str(path), "")[0] in (m.Success, m.NotConnected)
+    assert killer.wait(40) == 0
+    assert path.read_bytes() in (old, new)
+    # A fresh host reads the file whole.
+    reader = Client(start_host("--scene", str(path)))
+    assert reader.GetSceneName()[0] in ("Demo", "Saved again")
+    reader.close()
+    app.close()
