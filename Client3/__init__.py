@@ -442,7 +442,7 @@ Client = ZarvoPelluxPostClient
 def connect(host: str = "127.0.0.1", port: int = 0) -> Any:
     """A client connected to the application at host and port (0 means the default port, 8870);
     raises Client3.Error with the result code and text when connecting fails. `host` may carry
-    options: "127.0.0.1?timeout=2000&connect=500"."""
+    options: "127.0.0.1?timeout=2000&connect=500&token=SECRET"."""
     client = Client()
     client.Connect(host, port).check()
     return client

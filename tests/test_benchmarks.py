@@ -79,3 +79,14 @@ def test_bench_batch_quick_prints_its_table():
     assert [line[:2] for line in rates] == [["process", "pool"], ["Dask", "1"]], done.stdout
     assert [line[:2] for line in costs] == [["process", "pool"], ["Dask", "opening"]], done.stdout
     assert sum(line[:1] == ["goal:"] for line in lines) == 2, done.stdout
+
+
+def test_bench_load_quick_prints_its_table():
+    done = subprocess.run([sys.executable, os.path.join(BENCHMARKS, "bench_load.py"), "--quick"],
+                          capture_output=True, text=True, timeout=600)
+    assert done.returncode == 0, done.stdout + done.stderr
+    lines = [line.strip() for line in done.stdout.splitlines()]
+    assert lines[0].startswith("4 clients, 800 calls in "), done.stdout
+    for kind in ("write", "read", "trajectory", "count", "markers", "subjects", "all"):
+        assert any(line.split()[:1] == [kind] and len(line.split()) == 7 for line in lines), (kind, done.stdout)
+    assert "writes lost: 0; wrong reads: 0" in done.stdout
