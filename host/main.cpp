@@ -93,7 +93,7 @@ int Usage(const char* problem) {
                "  --files DIR      file commands may use only this directory (repeatable; default: any)\n"
                "  --max-clients N  clients served at once (default 64)\n"
                "  --max-frame N    the largest request in bytes, 64 to 67108864 (default 67108864)\n"
-               "  --rate N         requests per second served to each client, 0 for no limit (default 50000)\n"
+               "  --rate N         requests per second served to each client, 0 for no limit (default 100000)\n"
                "  --watch-stdin    stop when standard input reaches its end\n"
                "  --fault FAULT    test only: misbehave as FAULT says (see the reference page)\n");
   return problem ? 2 : 0;

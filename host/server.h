@@ -26,7 +26,7 @@ struct Options {
   std::size_t maxClients = 64;
   std::string token;                               // the access token clients must present; empty: none
   std::uint32_t maxFrame = protocol::kMaxFrame;     // the largest request payload accepted
-  int rate = 50000;                                // requests per second served to one client; 0: no limit
+  int rate = 100000;                               // requests per second served to one client; 0: no limit
   Faults faults;
   std::vector<ReplyFault> replyFaults;
   int exitAt = 0;           // test only: exit at once on this request (0: never) ...
