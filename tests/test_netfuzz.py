@@ -1,5 +1,6 @@
 """A network fuzzer against a running host: random, mutated, truncated, oversized and slowly dripped
-frames, half-closed connections, and thousands of connections opened and dropped. Throughout, the
+frames, half-closed connections, clients that never read their replies, and thousands of
+connections opened and dropped. Throughout, the
 host keeps serving a well-behaved client, and its memory and thread count stay bounded. Seeded, and
 bounded in rounds and time."""
 import os
@@ -124,6 +125,13 @@ class Fuzzer:
             assert reply(read_frame(sock)) == (3, m.Success, "")
             assert read_frame(sock) is None
 
+    def never_reads(self):
+        # Asks for more than the connection holds and reads none of it: the host's send blocks until
+        # the client goes.
+        sock = self.open()
+        sock.sendall(self.requests[2] * 60)
+        reset_and_close(sock) if self.rng.random() < 0.5 else sock.close()
+
     def burst(self):
         held = [self.open(shake=False) for _ in range(BURST)]
         for i, sock in enumerate(held):
@@ -132,7 +140,7 @@ class Fuzzer:
             reset_and_close(sock) if i % 3 == 0 else sock.close()
 
     KINDS = ["garbage_before_hello", "frame_that_is_no_request", "mutated_request", "unknown_command", "truncated",
-             "oversized", "half_closed", "burst"]
+             "oversized", "half_closed", "never_reads", "burst"]
 
 class Dripper:
     """A connection that sends requests one byte a round, and reads each reply once it is all sent."""
