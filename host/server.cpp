@@ -49,8 +49,9 @@ struct Client {
 
 enum class Got { Frame, Closed, TooLarge };
 
-// Reads a frame of at most `most` bytes whose first byte comes before `deadline`. Memory is taken as
-// the bytes arrive, so that a length announced and never sent costs nothing.
+// Reads a frame of at most `most` bytes whose header comes before `deadline`; the rest must follow
+// within kFrameTime. Memory is taken as the bytes arrive, so that a length announced and never sent
+// costs nothing.
 Got ReadFrame(Socket& socket, std::vector<char>& payload, std::uint32_t most, Clock::time_point deadline) {
   char header[protocol::kHeaderSize];
   if (socket.ReceiveAll(header, sizeof header, deadline) != Io::Done) return Got::Closed;

@@ -77,7 +77,7 @@ bool ParseAddress(std::string const& text, Address& out) {
     std::string_view value = std::string_view(option).substr(equals + 1);
     if (key == "token")
       out.token = value;
-    else if (key == "timeout" ? !ParseMilliseconds(value, out.reply) : key == "connect" ? !ParseMilliseconds(value, out.connect) : true)
+    else if ((key != "timeout" && key != "connect") || !ParseMilliseconds(value, key == "timeout" ? out.reply : out.connect))
       return false;
     query = next;
   }
