@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <unordered_set>
 
 #include "runtime/runtime.h"
 
@@ -22,14 +23,16 @@ SwigPyObject* AsProxy(PyObject* op) { return reinterpret_cast<SwigPyObject*>(op)
 
 // ---- SwigPyObject -----------------------------------------------------------------------------
 
+// The proxy's text, followed by those of the proxies chained after it. The chain is walked, not
+// recursed into, and ends where it comes back to a proxy already shown: `append` can make it loop.
 PyObject* ProxyRepr(PyObject* op, PyObject* = nullptr) {
-  SwigPyObject* self = AsProxy(op);
-  PyObject* repr = PyUnicode_FromFormat("<Swig Object of type '%s' at %p>", DisplayName(self->type), op);
-  if (repr && self->next) {
-    PyObject* tail = ProxyRepr(self->next);
-    PyObject* joined = tail ? PyUnicode_Concat(repr, tail) : nullptr;
+  PyObject* repr = PyUnicode_FromString("");
+  std::unordered_set<PyObject*> shown;
+  for (PyObject* at = op; repr && at && shown.insert(at).second; at = AsProxy(at)->next) {
+    PyObject* part = PyUnicode_FromFormat("<Swig Object of type '%s' at %p>", DisplayName(AsProxy(at)->type), at);
+    PyObject* joined = part ? PyUnicode_Concat(repr, part) : nullptr;
     Py_DECREF(repr);
-    Py_XDECREF(tail);
+    Py_XDECREF(part);
     repr = joined;
   }
   return repr;

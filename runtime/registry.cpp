@@ -257,6 +257,10 @@ int ConvertPtr(PyObject* object, void** out, TypeInfo* target, int flags, int* o
   }
   SwigPyObject* proxy = GetThisProxy(object);
   if (own) *own = 0;
+  // A chain that loops (`append` can make one) ends when the walk meets a proxy that moves along
+  // the chain at half its pace.
+  SwigPyObject* behind = proxy;
+  bool stepBehind = false;
   for (; proxy; proxy = reinterpret_cast<SwigPyObject*>(proxy->next)) {
     void* pointer = proxy->ptr;
     bool accepted = false, updateOwn = true;
@@ -280,6 +284,9 @@ int ConvertPtr(PyObject* object, void** out, TypeInfo* target, int flags, int* o
       return ResultOk;
     }
     if (!proxy->next || !SwigPyObject_Check(proxy->next)) break;
+    if (stepBehind) behind = reinterpret_cast<SwigPyObject*>(behind->next);
+    stepBehind = !stepBehind;
+    if (proxy->next == reinterpret_cast<PyObject*>(behind)) break;
   }
 
   int result = ResultError;

@@ -238,6 +238,10 @@ REFUSED = "in method 'SafeString_IsEmpty', argument 1 of type 'ZarvoSDKClientCPP
      "except TypeError:\n    print('refused')" % SAFE_STRING, "refused\n"),
     # A chain of "this" attributes that loops back holds no proxy.
     ("class Loop: pass\nloop = Loop()\nloop.this = loop\ncheck(loop)", REFUSED),
+    # A proxy chain that loops back (append can make one) is walked round once.
+    ("proxy = _Client3.new_ZarvoPelluxPostClient()\nproxy.append(proxy)\ncheck(proxy)", REFUSED),
+    ("first, second = _Client3.new_ZarvoPelluxPostClient(), _Client3.new_vectord()\n"
+     "first.append(second)\nsecond.append(first)\ncheck(first)", REFUSED),
     # A "this" made afresh on every access is gone once looked at: it holds no proxy.
     ("class Fresh:\n    this = property(lambda self: peer.make(%r, 16, 0))\ncheck(Fresh())" % SAFE_STRING, REFUSED),
 ])
