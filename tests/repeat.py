@@ -1,0 +1,134 @@
+"""Repeated calls of every function family, success and failure paths, with the growth of resident
+memory and of the interpreter's traced allocations measured over them.
+
+    python tests/repeat.py --calls 1000000      # every shape a million times; prints bytes per call
+
+The tests (test_repeat.py) run the same shapes a bounded number of times."""
+import argparse
+import gc
+import os
+import sys
+import tempfile
+import time
+import tracemalloc
+
+import _Client3 as m
+
+HERE = os.path.dirname(os.path.abspath(__file__))
+PAGE = os.sysconf("SC_PAGE_SIZE") if hasattr(os, "sysconf") else 4096
+
+
+def resident():
+    """The process's resident memory in bytes (Linux)."""
+    with open("/proc/self/statm") as statm:
+        return int(statm.read().split()[1]) * PAGE
+
+
+def expect(error, call, *args):
+    try:
+        call(*args)
+    except error:
+        return
+    raise AssertionError(f"{call.__name__}{args} did not raise {error.__name__}")
+
+
+def walk(iterator):
+    try:
+        while True:
+            m.SwigPyIterator_next(iterator)
+    except StopIteration:
+        pass
+
+
+def shapes(classes, client, connected):
+    """(family, shape, one call) for every family; the classes make proxies that free their objects."""
+    text = classes["SafeString"]("kept")
+    vector = classes["vectord"]([1.0, 2.0, 3.0])
+    texts = classes["vectorss"](["a", "b"])
+    ints = classes["vectori"]([1])
+    record = classes["Output_CircleFitSettings"]()
+    yield "proxy", "new and delete", lambda: classes["SafeString"]("kept")
+    yield "proxy", "wrong type", lambda: expect(TypeError, m.SafeString_IsEmpty, 5)
+    yield "arguments", "wrong count", lambda: expect(TypeError, m.ZarvoPelluxPostClient_Connect, client)
+    yield "scalar", "int out of range", lambda: expect(OverflowError, m.vectori_append, ints, 2 ** 40)
+    yield "scalar", "float that raises", lambda: expect(TypeError, m.vectord_append, vector, "x")
+    yield "text", "value of a kept text", lambda: m.SafeString_Value(text)
+    yield "text", "overload that does not match", lambda: expect(TypeError, m.new_SafeString, b"\xff", 1)
+    yield "vector", "append and pop", lambda: (m.vectord_append(vector, 4.0), m.vectord_pop(vector))
+    yield "vector", "index out of range", lambda: expect(IndexError, m.vectord___getitem__, vector, 10)
+    yield "vector", "texts written and read", lambda: (m.vectorss___setitem__(texts, 0, "b"), m.vectorss___getitem__(texts, 0))
+    yield "slice", "set and delete", lambda: (m.vectord___setitem__(vector, slice(3, 3), [1.0, 2.0]),
+                                              m.vectord___delitem__(vector, slice(3, 5)))
+    yield "slice", "extended slice of a wrong size", lambda: expect(ValueError, m.vectord___setitem__, vector, slice(0, 3, 2), [1.0])
+    yield "iterator", "walk", lambda: walk(m.vectord_iterator(vector))
+    yield "iterator", "past the end", lambda: expect(StopIteration, m.SwigPyIterator_value, m.vectord_end(vector))
+    yield "sequence", "lists as vector arguments", lambda: m.ZarvoPelluxPostClient_SetTrajectory(
+        client, "Alice", "LANK", [1.0, 2.0], (3.0, 4.0), [5.0, 6.0], [True, False])
+    yield "sequence", "bad element", lambda: expect(TypeError, m.ZarvoPelluxPostClient_SetTrajectory,
+                                                    client, "Alice", "LANK", [1.0], [2.0], [3.0, "x"], [True])
+    yield "record", "settings field set and get", lambda: (m.Output_CircleFitSettings_NumThreads_set(record, 3),
+                                                           m.Output_CircleFitSettings_NumThreads_get(record))
+    yield "record", "field of a wrong type", lambda: expect(TypeError, m.Output_CircleFitSettings_Enabled_set, record, 1)
+    yield "client", "unconnected call", lambda: m.ZarvoPelluxPostClient_GetMarkerNames(client, "Alice")
+    yield "client", "call that the application refuses", lambda: m.ZarvoPelluxPostClient_GetMarkerNames(connected, "Nobody")
+    yield "client", "trajectory read", lambda: m.ZarvoPelluxPostClient_GetTrajectory(connected, "Alice", "LANK")
+    yield "client", "request by name", lambda: m.ZarvoPelluxPostClient_PSL(connected, "GetFrameCount")
+
+
+# The documented leaks, with the bytes each call leaves behind at the least: a vector made by its
+# new_ function is never destroyed (its proxy's type has no destructor), and new_SafeString keeps
+# each distinct text it was given for the life of the process.
+VALUES = 1000
+
+
+def leaks(classes):
+    counter = iter(range(10 ** 9))
+    yield "vector made by new_vectord", VALUES * 8, lambda: m.new_vectord([0.5] * VALUES)
+    yield "new_SafeString of a new text", VALUES, lambda: m.new_SafeString("%0*d" % (VALUES, next(counter)))
+
+
+def growth(call, calls):
+    """(resident bytes, traced bytes) gained per call over `calls` calls, after a tenth as many to
+    settle the allocators."""
+    for _ in range(max(1, calls // 10)):
+        call()
+    gc.collect()
+    tracemalloc.start()
+    traced, rss = tracemalloc.get_traced_memory()[0], resident()
+    for _ in range(calls):
+        call()
+    gc.collect()
+    traced_after, rss_after = tracemalloc.get_traced_memory()[0], resident()
+    tracemalloc.stop()
+    return (rss_after - rss) / calls, (traced_after - traced) / calls
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__.split("\n\n")[0])
+    parser.add_argument("--calls", type=int, default=1000000)
+    options = parser.parse_args()
+    sys.path.insert(0, HERE)
+    import companion
+    import hostproc
+    classes = companion.register()
+    with tempfile.TemporaryDirectory() as folder:
+        host = hostproc.start(log_path=os.path.join(folder, "host.log"))
+        try:
+            client, connected = classes["ZarvoPelluxPostClient"](), classes["ZarvoPelluxPostClient"]()
+            m.ZarvoPelluxPostClient_Connect(connected, host.address, host.port)
+            print(f"{'family':10} {'shape':36} {'resident B/call':>16} {'traced B/call':>14} {'us/call':>8}")
+            for family, shape, call in shapes(classes, client, connected):
+                started = time.perf_counter()
+                rss, traced = growth(call, options.calls)
+                took = (time.perf_counter() - started) / (options.calls * 1.1) * 1e6
+                print(f"{family:10} {shape:36} {rss:16.4f} {traced:14.4f} {took:8.1f}", flush=True)
+            for shape, least, call in leaks(classes):
+                calls = max(1, options.calls // 100)
+                rss, traced = growth(call, calls)
+                print(f"{'leak':10} {shape:36} {rss:16.1f} {traced:14.4f}   (at least {least} bytes per call, {calls} calls)", flush=True)
+        finally:
+            host.stop()
+
+
+if __name__ == "__main__":
+    main()
