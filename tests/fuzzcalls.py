@@ -414,7 +414,10 @@ def run_batch(seed, calls, timeout):
 def _run_child(seed, calls, port, folder, timeout):
     command = [sys.executable, "-X", "faulthandler", os.path.abspath(__file__), "--child",
                "--seed", str(seed), "--calls", str(calls), "--port", str(port)]
-    environment = dict(os.environ, PYTHONHASHSEED="0")
+    # Under the sanitizers, memory errors are looked for but not leaks: a batch registers random classes,
+    # so the documented leak of proxies without a destructor is everywhere (repeat.py measures leaks).
+    options = ":".join(filter(None, [os.environ.get("ASAN_OPTIONS"), "detect_leaks=0"]))
+    environment = dict(os.environ, PYTHONHASHSEED="0", ASAN_OPTIONS=options)
     try:
         done = subprocess.run(command, capture_output=True, text=True, timeout=timeout, cwd=folder, env=environment)
     except subprocess.TimeoutExpired:

@@ -14,6 +14,12 @@ ADDRESS = "127.0.0.1"
 NAME = "client3-host"
 
 
+def tool_environment():
+    """The environment for a native tool that a test runs (a compiler, a build tool, Wine): without the
+    sanitizer runtime that a sanitized run preloads into the interpreters."""
+    return {k: v for k, v in os.environ.items() if k != "LD_PRELOAD"}
+
+
 def executable():
     """The installed application: next to this interpreter's scripts first, then on PATH."""
     beside = os.path.join(sysconfig.get_path("scripts"), NAME + (".exe" if os.name == "nt" else ""))

@@ -51,6 +51,7 @@ def test_documented_leaks_have_their_size_per_call(registered_classes, capfd, in
 
 
 @linux
+@pytest.mark.skipif(SANITIZED, reason="the sanitizer's quarantine grows resident memory")
 def test_the_same_text_is_kept_once(registered_classes):
     resident, _ = repeat.growth(lambda: repeat.m.new_SafeString("x" * repeat.VALUES), CALLS)
     assert resident * CALLS < RESIDENT_BOUND

@@ -21,6 +21,7 @@ import pytest
 
 import _Client3 as m
 import companion
+import hostproc
 
 try:
     import fcntl
@@ -49,7 +50,7 @@ pytestmark = pytest.mark.skipif(bool(MISSING), reason="needs " + " and ".join(MI
 def run(command, log, timeout):
     """Runs a build step with its output appended to `log`; fails the test with the log's end."""
     with open(log, "a") as out:
-        done = subprocess.run(command, stdout=out, stderr=subprocess.STDOUT, timeout=timeout)
+        done = subprocess.run(command, stdout=out, stderr=subprocess.STDOUT, timeout=timeout, env=hostproc.tool_environment())
     if done.returncode != 0:
         pytest.fail(f"{' '.join(map(str, command))} failed:\n" + Path(log).read_text()[-4000:])
 
@@ -73,7 +74,7 @@ def windows_exe():
 def wine_env(tmp_path_factory):
     """The environment of Wine processes: a prefix of this session's own, quiet, without a display.
     Wine's server and what it started are stopped when the session ends."""
-    env = {k: v for k, v in os.environ.items() if k != "DISPLAY"}
+    env = {k: v for k, v in hostproc.tool_environment().items() if k != "DISPLAY"}
     env.update(WINEPREFIX=str(tmp_path_factory.mktemp("wine")), WINEDEBUG="-all", WINEDLLOVERRIDES="mscoree,mshtml=")
     yield env
     server = shutil.which("wineserver") or str(Path(wine_loader()).with_name("wineserver"))

@@ -7,6 +7,8 @@ import subprocess
 import sys
 import sysconfig
 
+import hostproc
+
 HERE = os.path.dirname(os.path.abspath(__file__))
 ROOT = os.path.dirname(os.path.dirname(HERE))
 NAME = "_Client3Peer"
@@ -28,7 +30,7 @@ def peer(directory):
         "-I", os.path.join(ROOT, "include"), *[os.path.join(ROOT, s) for s in SOURCES],
         os.path.join(HERE, "peer.cpp"), "-o", target,
     ]
-    done = subprocess.run(command, capture_output=True, text=True)
+    done = subprocess.run(command, capture_output=True, text=True, env=hostproc.tool_environment())
     if done.returncode != 0:
         raise RuntimeError("building the peer module failed:\n" + done.stderr)
     sys.path.insert(0, str(directory))
