@@ -6,14 +6,13 @@ import os
 import pytest
 
 import repeat
+from conftest import SANITIZED
 
 CALLS = 20000
 # Allocators keep a little of what they were given: the bound is far below one leaked object per call.
 RESIDENT_BOUND = 64 * 1024
 TRACED_BOUND = 16 * 1024
 linux = pytest.mark.skipif(not os.path.exists("/proc/self/statm"), reason="resident memory is read from /proc")
-# The address sanitizer keeps freed memory in quarantine, so resident memory grows under it.
-SANITIZED = "libasan" in os.environ.get("LD_PRELOAD", "")
 
 
 @pytest.fixture(scope="module")
