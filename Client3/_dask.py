@@ -49,13 +49,14 @@ def results(job: batch.Job, todo: Sequence[Tuple[str, str]], cluster: Any, retri
         futures = client.map(_task, takes, [path for _, path in todo], plan=(job, retries, options), pure=False)
         take_of = {future.key: take for future, take in zip(futures, takes)}
         try:
-            # Results are gathered in the background as tasks finish; a task that failed (a worker lost
-            # too often, for one) gives its exception.
-            for future, result in distributed.as_completed(futures, with_results=True, raise_errors=False):
-                if future.status != "finished":
+            # Each result is fetched as its task finishes. (Gathering them in the background, through
+            # as_completed's with_results, was seen to wait for ever once every task had finished.)
+            for future in distributed.as_completed(futures):
+                if future.status == "finished":
+                    yield future.result()
+                else:  # the task itself failed: a worker lost too often, for one
                     error = future.exception()
-                    result = batch.Result(take_of[future.key], False, f"{type(error).__name__}: {error}", 0.0, "")
-                yield result
+                    yield batch.Result(take_of[future.key], False, f"{type(error).__name__}: {error}", 0.0, "")
         finally:
             client.cancel(futures)
     finally:
