@@ -52,11 +52,11 @@ def results(job: batch.Job, todo: Sequence[Tuple[str, str]], cluster: Any, retri
             # Each result is fetched as its task finishes. (Gathering them in the background, through
             # as_completed's with_results, was seen to wait for ever once every task had finished.)
             for future in distributed.as_completed(futures):
-                if future.status == "finished":
-                    yield future.result()
-                else:  # the task itself failed: a worker lost too often, for one
-                    error = future.exception()
-                    yield batch.Result(take_of[future.key], False, f"{type(error).__name__}: {error}", 0.0, "")
+                try:
+                    result = future.result()
+                except Exception as error:  # the task itself failed: a worker lost too often, for one
+                    result = batch.Result(take_of[future.key], False, f"{type(error).__name__}: {error}", 0.0, "")
+                yield result
         finally:
             client.cancel(futures)
     finally:

@@ -76,9 +76,15 @@ def serial(takes):
 
 @pytest.fixture(scope="module")
 def dask_cluster():
-    with distributed.LocalCluster(n_workers=2, threads_per_worker=1, processes=True, host="127.0.0.1", dashboard_address="127.0.0.1:0") as cluster:
+    cluster = distributed.LocalCluster(n_workers=2, threads_per_worker=1, processes=True, host="127.0.0.1", dashboard_address="127.0.0.1:0")
+    try:
         with distributed.Client(cluster) as client:
             yield client
+    finally:
+        try:
+            cluster.close()
+        except RuntimeError:  # seen once on 3.9: Dask's own wait on its event loop failed; the workers end with the run
+            pass
 
 
 @pytest.fixture(params=["pool", "dask"])
