@@ -58,14 +58,21 @@ print("saved", flush=True)
 """
 
 
-@pytest.mark.parametrize("delay", [0.1, 0.4])
-def test_client_killed_mid_save(start_host, tmp_path, delay):
+def saved_take(start_host, tmp_path):
+    """A host, its client, and the take saved in a folder of its own beside the path of a reference
+    file: (host, client, folder, take's path, reference's path)."""
     host = start_host("--frames", FRAMES)
     app = Client(host)
     files = tmp_path / "files"
     files.mkdir()
     path, reference = files / "take.scene", files / "reference.scene"
     app.SaveFile(str(path), "")
+    return host, app, files, path, reference
+
+
+@pytest.mark.parametrize("delay", [0.1, 0.4])
+def test_client_killed_mid_save(start_host, tmp_path, delay):
+    host, app, files, path, reference = saved_take(start_host, tmp_path)
     old = path.read_bytes()
     saver = subprocess.Popen([sys.executable, "-c", SAVER.format(tests=os.path.dirname(companion.__file__),
                                                                   port=host.port, name="Saved by a client", path=str(path))],
@@ -99,12 +106,7 @@ os.kill(pid, signal.SIGKILL)
 
 
 def test_host_killed_as_it_begins_to_write(start_host, tmp_path):
-    host = start_host("--frames", FRAMES)
-    app = Client(host)
-    files = tmp_path / "files"
-    files.mkdir()
-    path, reference = files / "take.scene", files / "reference.scene"
-    app.SaveFile(str(path), "")
+    host, app, files, path, reference = saved_take(start_host, tmp_path)
     old = path.read_bytes()
     app.SetSceneName("Saved again")
     app.SaveFile(str(reference), "")
