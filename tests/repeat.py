@@ -5,6 +5,7 @@ memory and of the interpreter's traced allocations measured over them.
 
 The tests (test_repeat.py) run the same shapes a bounded number of times."""
 import argparse
+import ctypes
 import gc
 import os
 import sys
@@ -22,6 +23,27 @@ def resident():
     """The process's resident memory in bytes (Linux)."""
     with open("/proc/self/statm") as statm:
         return int(statm.read().split()[1]) * PAGE
+
+
+class MallInfo2(ctypes.Structure):
+    _fields_ = [(name, ctypes.c_size_t) for name in
+                ("arena", "ordblks", "smblks", "hblks", "hblkhd", "usmblks", "fsmblks", "uordblks", "fordblks", "keepcost")]
+
+
+def heap_meter():
+    """A function giving the bytes that the C heap has handed out (the GNU C library's count), or None
+    where that is not measurable: another C library, or another allocator in use (a sanitizer's)."""
+    libc = ctypes.CDLL(None)
+    if not hasattr(libc, "mallinfo2"):
+        return None
+    libc.mallinfo2.restype = MallInfo2
+    libc.malloc.restype = ctypes.c_void_p
+    in_use = lambda: libc.mallinfo2().uordblks + libc.mallinfo2().hblkhd  # noqa: E731
+    before = in_use()
+    block = libc.malloc(65536)
+    seen = in_use() - before
+    libc.free(ctypes.c_void_p(block))
+    return in_use if seen >= 65536 else None
 
 
 def expect(error, call, *args):
@@ -94,18 +116,18 @@ QUIET = [tracemalloc.Filter(False, pattern) for pattern in (
     "*/multiprocessing/*", "*/distributed/*", "*/tornado/*", "*/dask/*", "*/psutil/*")]
 
 
-def growth(call, calls):
-    """(resident bytes, traced bytes) gained per call over `calls` calls, after a tenth as many to
+def growth(call, calls, meter=resident):
+    """(bytes of `meter`, traced bytes) gained per call over `calls` calls, after a tenth as many to
     settle the allocators."""
     for _ in range(max(1, calls // 10)):
         call()
     gc.collect()
     tracemalloc.start()
-    before, rss = tracemalloc.take_snapshot(), resident()
+    before, rss = tracemalloc.take_snapshot(), meter()
     for _ in range(calls):
         call()
     gc.collect()
-    after, rss_after = tracemalloc.take_snapshot(), resident()
+    after, rss_after = tracemalloc.take_snapshot(), meter()
     tracemalloc.stop()
     traced = sum(stat.size_diff for stat in after.filter_traces(QUIET).compare_to(before.filter_traces(QUIET), "filename"))
     return (rss_after - rss) / calls, traced / calls

@@ -6,6 +6,7 @@ import pytest
 
 import _Client3
 import companion
+import repeat
 from conftest import overload_text, raises
 
 TEXT_FUNCTIONS = ["SafeString_Value", "SafeString___str__", "SafeString___repr__"]
@@ -72,25 +73,11 @@ def test_new_safe_string_forms(peer):
            _Client3.new_SafeString, None)
 
 
-class MallInfo2(ctypes.Structure):
-    _fields_ = [(name, ctypes.c_size_t) for name in
-                ("arena", "ordblks", "smblks", "hblks", "hblkhd", "usmblks", "fsmblks", "uordblks", "fordblks", "keepcost")]
-
-
 def heap_meter():
-    """A function giving the bytes that the C heap has handed out; the test is skipped where that is not measurable."""
-    libc = ctypes.CDLL(None)
-    if not hasattr(libc, "mallinfo2"):
-        pytest.skip("no mallinfo2 in this C library")
-    libc.mallinfo2.restype = MallInfo2
-    libc.malloc.restype = ctypes.c_void_p
-    before = libc.mallinfo2().uordblks
-    block = libc.malloc(65536)
-    seen = libc.mallinfo2().uordblks - before
-    libc.free(ctypes.c_void_p(block))
-    if seen < 65536:
-        pytest.skip("the allocator in use is not the one mallinfo2 reports on")  # as under the address sanitizer
-    return lambda: libc.mallinfo2().uordblks
+    in_use = repeat.heap_meter()
+    if in_use is None:
+        pytest.skip("the C heap's use is not measurable here")
+    return in_use
 
 
 def test_new_safe_string_keeps_each_text_once():
