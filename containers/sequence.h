@@ -4,6 +4,7 @@
 #pragma once
 
 #include <cstdio>
+#include <cstring>
 #include <memory>
 #include <stdexcept>
 #include <type_traits>
@@ -129,6 +130,51 @@ void FillFromSequence(PyObject* o, std::vector<T>& out) {
   }
 }
 
+// The standard module's arrays whose items have the element's own machine type. Reading their items
+// runs no script code and gives plain numbers that convert exactly, so their memory is copied as it
+// is. A subclass may read its items otherwise and is read as any other sequence.
+template <class T>
+bool OwnTypeCode(const char* format) {
+  char code = format && format[0] && !format[1] ? format[0] : '\0';
+  if constexpr (std::is_same_v<T, double>)
+    return code == 'd';
+  else if constexpr (std::is_same_v<T, float>)
+    return code == 'f';
+  else if constexpr (std::is_same_v<T, int>)
+    return code == 'i' || (code == 'l' && sizeof(long) == sizeof(int));
+  else if constexpr (std::is_same_v<T, unsigned long long>)
+    return code == 'Q' || (code == 'L' && sizeof(unsigned long) == sizeof(T));
+  else
+    return false;
+}
+
+struct ArrayView {
+  Py_buffer view{};
+  bool held = false;
+  ArrayView() = default;
+  ArrayView(const ArrayView&) = delete;
+  ~ArrayView() {
+    if (held) PyBuffer_Release(&view);
+  }
+};
+
+// True, with the array's memory held in `array`, for such an array.
+template <class T>
+bool OwnTypeArray(PyObject* o, ArrayView& array) {
+  if constexpr (std::is_same_v<T, bool> || !std::is_arithmetic_v<T>) {
+    return false;
+  } else {
+    if (std::strcmp(Py_TYPE(o)->tp_name, "array.array") != 0) return false;
+    if (PyObject_GetBuffer(o, &array.view, PyBUF_FORMAT | PyBUF_ND) < 0) {
+      PyErr_Clear();
+      return false;
+    }
+    array.held = array.view.itemsize == sizeof(T) && OwnTypeCode<T>(array.view.format);
+    if (!array.held) PyBuffer_Release(&array.view);
+    return array.held;
+  }
+}
+
 template <class T>
 bool SequenceConverts(PyObject* o) {
   if (PyList_CheckExact(o) || PyTuple_CheckExact(o)) {
@@ -137,6 +183,7 @@ bool SequenceConverts(PyObject* o) {
       if (!ElementOf<T>::check(items[i])) return false;
     return true;
   }
+  if (ArrayView array; OwnTypeArray<T>(o, array)) return true;
   Py_ssize_t size = PySequence_Size(o);
   if (size < 0) {
     PyErr_Clear();
@@ -170,10 +217,15 @@ int AsVector(PyObject* o, std::vector<T>** out) {
   if (!out) return SequenceConverts<T>(o) ? int(ResultOk) : int(ResultError);
   auto made = std::make_unique<std::vector<T>>();
   try {
-    if (listOrTuple)
+    ArrayView array;
+    if (listOrTuple) {
       FillFromListOrTuple(o, *made);
-    else
+    } else if (OwnTypeArray<T>(o, array)) {
+      const T* items = static_cast<const T*>(array.view.buf);
+      made->assign(items, items + array.view.len / array.view.itemsize);
+    } else {
       FillFromSequence(o, *made);
+    }
   } catch (const std::exception& error) {
     if (!PyErr_Occurred()) PyErr_SetString(PyExc_TypeError, error.what());
     return ResultError;

@@ -1,4 +1,5 @@
 """Script sequences and vector proxies where a whole vector is expected."""
+import array
 import collections
 import sys
 
@@ -193,3 +194,34 @@ def test_elements_read_from_a_sequence_are_released(source, accepted):
         else:
             pytest.raises(TypeError, m.new_vectord, source())
     assert [sys.getrefcount(item) for item in items] == before
+
+
+def outcome(inst, source):
+    """What making a vector from `source` gives: its contents, or the refusal's type and text."""
+    try:
+        return inst.read(inst.new(source))
+    except (TypeError, OverflowError) as error:
+        return type(error), str(error)
+
+
+def extremes(code):
+    if code in "fd":
+        return [0.5, -2.25, 3.0e38 if code == "f" else 1e300]
+    bits = array.array(code).itemsize * 8
+    return [0, 2 ** bits - 1] if code.isupper() else [-(2 ** (bits - 1)), 2 ** (bits - 1) - 1]
+
+
+@pytest.mark.parametrize("inst", [i for i in INSTANCES if not i.text], ids=lambda inst: inst.prefix)
+@pytest.mark.parametrize("code", "bBhHiIlLqQfd")
+def test_arrays_convert_as_lists_of_their_items(inst, code):
+    source = array.array(code, extremes(code))
+    assert outcome(inst, source) == outcome(inst, list(source))
+    assert outcome(inst, array.array(code)) == []
+
+
+def test_an_array_subclass_is_read_through_its_own_items():
+    class Doubled(array.array):
+        def __getitem__(self, index):
+            return 2 * super().__getitem__(index)
+
+    assert m.vectord___getitem__(m.new_vectord(Doubled("d", [1.0, 2.5])), 1) == 5.0
