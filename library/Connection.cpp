@@ -87,11 +87,16 @@ bool ParseAddress(std::string const& text, Address& out) {
 }  // namespace
 
 ClientConnection::Call::Call(ClientConnection& connection, Id id)
-    : lock_(connection.mutex_), connection_(connection), id_(++connection.lastId_) {
-  Writer& w = connection.request_;
+    : lock_(connection.mutex_), connection_(connection), command_(id) {}
+
+bool ClientConnection::Call::Begin() {
+  if (!connection_.socket_.valid()) return false;
+  id_ = ++connection_.lastId_;
+  Writer& w = connection_.request_;
   w.Clear(Request);
   w.Raw(id_);
-  w.Raw(static_cast<std::uint16_t>(id));
+  w.Raw(static_cast<std::uint16_t>(command_));
+  return true;
 }
 
 ResultCode::Enum ClientConnection::Lost() {

@@ -23,11 +23,14 @@ inline constexpr std::chrono::milliseconds kReplyTimeout{30000};
 
 class ClientConnection {
 public:
-  // One request under way: its frame is written between Start and Exchange, and its reply's outputs
+  // One request under way: its frame is written between Begin and Exchange, and its reply's outputs
   // are read after. The connection stays locked for the whole exchange.
   class Call {
   public:
     client3::protocol::Writer& request() { return connection_.request_; }
+    // Starts the request's frame, or returns false when there is no connection to send it on (its
+    // arguments then need no writing).
+    bool Begin();
     // Sends the request and waits for its reply. On Success, `outputs()` reads the reply's values;
     // `message` is the application's text (empty when it sent none).
     ResultCode::Enum Exchange(std::string& message);
@@ -38,7 +41,8 @@ public:
     Call(ClientConnection& connection, client3::protocol::Id id);
     std::lock_guard<std::mutex> lock_;
     ClientConnection& connection_;
-    std::uint32_t id_;
+    client3::protocol::Id command_;
+    std::uint32_t id_ = 0;
     std::size_t outputsAt_ = 0;
   };
 

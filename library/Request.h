@@ -173,6 +173,14 @@ inline SafeString Owned(std::string_view text) {
   return SafeString(VStringFactory::Instance(), std::string(text).c_str());
 }
 
+// Gives `target` its own copy of `text`: one duplication, where assigning a new SafeString makes two.
+inline void Own(SafeString& target, char const* text) {
+  SafeString made(VStringFactory::Instance(), text);
+  std::swap(target.OwnedText, made.OwnedText);
+  std::swap(target.ViewText, made.ViewText);
+  std::swap(target.Factory, made.Factory);
+}
+
 // A number, also accepted as its text.
 template <class T>
 T Number(Reader& r) {
@@ -200,10 +208,10 @@ void Read(Reader& r, T& out) {
   if constexpr (std::is_arithmetic_v<T>) {
     out = Number<T>(r);
   } else if constexpr (std::is_same_v<T, SafeString>) {
-    out = Owned(r.Text());
+    Own(out, std::string(r.Text()).c_str());
   } else if constexpr (std::is_same_v<T, std::vector<SafeString>>) {
     out.clear();
-    r.GetTexts([&](std::string_view text) { out.push_back(Owned(text)); });
+    r.GetTexts([&](std::string_view text) { out.emplace_back(VStringFactory::Instance(), std::string(text).c_str()); });
   } else if constexpr (std::is_same_v<T, std::vector<Type_Parameter>>) {
     out.clear();
     r.GetPairs([&](std::string_view name, std::string_view value) { out.push_back({Owned(name), Owned(value)}); });
@@ -230,7 +238,7 @@ void ReadFields(Reader& r, R& record) {
 // Sets the result code and its text: the application's message when it sent one.
 inline void SetResult(Output_Result& record, ResultCode::Enum code, std::string const& message) {
   record.Result = code;
-  record.ResultString = Owned(message.empty() ? std::string_view(ResultText(code)) : std::string_view(message));
+  Own(record.ResultString, message.empty() ? ResultText(code) : message.c_str());
 }
 
 // Sends command C with `args` and reads the reply with `read(reader, record)` into a record R.
@@ -242,8 +250,10 @@ R Exchange(ClientConnection* connection, Read read, A const&... args) {
   ResultCode::Enum code = ResultCode::NotConnected;
   if (connection) {
     auto call = connection->Start(C);
-    (Put(call.request(), args), ...);
-    code = call.Exchange(message);
+    if (call.Begin()) {
+      (Put(call.request(), args), ...);
+      code = call.Exchange(message);
+    }
     if (code == ResultCode::Success) {
       try {
         Reader outputs = call.outputs();
