@@ -47,8 +47,8 @@ bool ParseInt(std::string_view text, int& out, int least, int most) {
   return true;
 }
 
-// KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, frames=N,
-// exit=N.
+// KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, announce,
+// frames=N, stage-delay=MS, exit=N.
 bool ParseFault(std::string_view fault, Options& options) {
   std::string command;
   if (auto at = fault.find('@'); at != std::string_view::npos) command = fault.substr(at + 1), fault = fault.substr(0, at);
@@ -61,7 +61,8 @@ bool ParseFault(std::string_view fault, Options& options) {
   if (kind == "exit") return number > 0 && (options.exitAt = number, options.exitCommand = command, true);
   static const std::pair<std::string_view, ReplyFault::Kind> kinds[] = {
       {"delay", ReplyFault::Delay}, {"garbage", ReplyFault::Garbage}, {"close", ReplyFault::Close},
-      {"text", ReplyFault::Text},   {"status", ReplyFault::Status},   {"oversize", ReplyFault::Oversize}};
+      {"text", ReplyFault::Text},   {"status", ReplyFault::Status},   {"oversize", ReplyFault::Oversize},
+      {"announce", ReplyFault::Announce}};
   for (auto [name, k] : kinds)
     if (kind == name) return options.replyFaults.push_back({k, number, command}), true;
   return false;

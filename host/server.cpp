@@ -29,9 +29,8 @@ namespace {
 constexpr auto kHelloTime = std::chrono::seconds(10);
 // A frame, once begun, must arrive whole within this time.
 constexpr auto kFrameTime = std::chrono::seconds(30);
-// A payload's buffer starts this large and doubles as its bytes come; a larger one is let go after
-// its request.
-constexpr std::size_t kFirstChunk = 64 << 10;
+// A payload's buffer larger than this is let go after its request.
+constexpr std::size_t kKeptBuffer = 1 << 20;
 
 struct Shared {
   Scene& scene;
@@ -50,8 +49,7 @@ struct Client {
 enum class Got { Frame, Closed, TooLarge };
 
 // Reads a frame of at most `most` bytes whose header comes before `deadline`; the rest must follow
-// within kFrameTime. Memory is taken as the bytes arrive, so that a length announced and never sent
-// costs nothing.
+// within kFrameTime.
 Got ReadFrame(Socket& socket, std::vector<char>& payload, std::uint32_t most, Clock::time_point deadline) {
   char header[protocol::kHeaderSize];
   if (socket.ReceiveAll(header, sizeof header, deadline) != Io::Done) return Got::Closed;
@@ -59,13 +57,7 @@ Got ReadFrame(Socket& socket, std::vector<char>& payload, std::uint32_t most, Cl
   std::memcpy(&size, header, sizeof size);
   if (size == 0 || size > most) return Got::TooLarge;
   deadline = std::min(deadline, Clock::now() + kFrameTime);
-  std::size_t have = 0;
-  payload.resize(std::min<std::size_t>(size, kFirstChunk));
-  while (socket.ReceiveAll(payload.data() + have, payload.size() - have, deadline) == Io::Done) {
-    if ((have = payload.size()) == size) return Got::Frame;
-    payload.resize(std::min<std::size_t>(size, 2 * have));
-  }
-  return Got::Closed;
+  return socket.ReceiveGrowing(payload, size, deadline) == Io::Done ? Got::Frame : Got::Closed;
 }
 
 void Send(Socket& socket, Writer& frame) {
@@ -168,10 +160,12 @@ bool SendReply(Socket& socket, Writer& reply, const ReplyFault* fault) {
       socket.SendAll(bytes.data(), bytes.size() / 2);
       return false;
     }
-    case ReplyFault::Oversize: {
-      std::uint32_t size = protocol::kMaxFrame + 1;
+    case ReplyFault::Oversize:
+    case ReplyFault::Announce: {
+      // A reply too large to take, then the end; or the largest reply, of which nothing follows.
+      std::uint32_t size = fault->kind == ReplyFault::Oversize ? protocol::kMaxFrame + 1 : protocol::kMaxFrame;
       socket.SendAll(reinterpret_cast<const char*>(&size), sizeof size);
-      return false;
+      return fault->kind == ReplyFault::Announce;
     }
     default:
       break;
@@ -189,7 +183,7 @@ void ServeClient(Shared& shared, Client& client) {
   Throttle throttle(shared.options.rate);
   if (Handshake(socket, shared.options)) {
     for (;;) {
-      if (payload.capacity() > 16 * kFirstChunk) std::vector<char>().swap(payload);
+      if (payload.capacity() > kKeptBuffer) std::vector<char>().swap(payload);
       Got got = ReadFrame(socket, payload, shared.options.maxFrame, Clock::time_point::max());
       if (got == Got::TooLarge) {
         SendRefusal(socket, "a frame may hold at most " + std::to_string(shared.options.maxFrame) + " bytes");

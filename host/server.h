@@ -13,7 +13,7 @@ namespace client3::host {
 
 // Test-only misbehaviour of replies: each applies to every command, or to the one named after '@'.
 struct ReplyFault {
-  enum Kind { Delay, Garbage, Close, Text, Status, Oversize } kind;
+  enum Kind { Delay, Garbage, Close, Text, Status, Oversize, Announce } kind;
   int value = 0;
   std::string command;  // empty: every command
 };

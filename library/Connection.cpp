@@ -117,8 +117,7 @@ ResultCode::Enum ClientConnection::Receive(Clock::time_point deadline) {
     socket_.Close();
     return ResultCode::ReplyParsingError;
   }
-  reply_.resize(size);
-  io = socket_.ReceiveAll(reply_.data(), size, deadline);
+  io = socket_.ReceiveGrowing(reply_, size, deadline);
   return io == Io::Done ? ResultCode::Success : HalfFrame(io);
 }
 

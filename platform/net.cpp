@@ -260,6 +260,18 @@ Io Socket::ReceiveAll(char* data, std::size_t size, Clock::time_point deadline) 
   return Io::Done;
 }
 
+Io Socket::ReceiveGrowing(std::vector<char>& into, std::size_t size, Clock::time_point deadline) {
+  constexpr std::size_t kFirstChunk = 64 << 10;
+  std::size_t have = 0;
+  into.resize(size < kFirstChunk ? size : kFirstChunk);
+  for (;;) {
+    if (Io io = ReceiveAll(into.data() + have, into.size() - have, deadline); io != Io::Done)
+      return io == Io::TimedOut && have ? Io::Stalled : io;
+    if ((have = into.size()) == size) return Io::Done;
+    into.resize(size < 2 * have ? size : 2 * have);
+  }
+}
+
 bool Socket::PeerClosed() const {
   if (!valid()) return true;
   pollfd fd{};

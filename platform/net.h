@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <ctime>
 #include <string>
+#include <vector>
 
 namespace client3::platform {
 
@@ -49,6 +50,9 @@ public:
   bool SendAll(const char* data, std::size_t size);
   // Receives exactly `size` bytes before `deadline` (Clock::time_point::max() waits as long as it takes).
   Io ReceiveAll(char* data, std::size_t size, Clock::time_point deadline);
+  // Receives exactly `size` bytes into `into`, which grows as they come (from 64 KiB, doubling), so
+  // that a length announced and never sent costs no memory.
+  Io ReceiveGrowing(std::vector<char>& into, std::size_t size, Clock::time_point deadline);
   // Whether the peer has closed its end (looked at without waiting and without taking any data).
   bool PeerClosed() const;
 

@@ -17,6 +17,7 @@ import pytest
 
 import _Client3 as m
 import companion
+import repeat
 
 FRAMES = 1000
 MARKERS = "LFHD RFHD C7 STRN LASI RASI LWRA RWRA LKNE RKNE LANK RANK".split()
@@ -616,6 +617,16 @@ def test_timed_out_request_and_its_late_reply(start_host, clients):
     assert call(client, "GetFrameCount") == 0
     time.sleep(1.2)
     assert read(ok(call(client, "GetMarkerNames", "Alice")), "Names") == MARKERS
+
+
+@pytest.mark.skipif(not os.path.exists("/proc/self/statm"), reason="resident memory is read from /proc")
+def test_a_reply_announced_and_never_sent_takes_no_memory(start_host, clients):
+    client = clients(start_host("--fault", "announce@GetSceneName"), "timeout=300")
+    before = repeat.resident()
+    assert result(call(client, "GetSceneName")) == (m.RequestTimedOut, TIMED_OUT)
+    assert repeat.resident() - before < 8 << 20  # the announced reply is 64 MiB
+    # The rest of that reply could no longer be told from the next one's.
+    assert call(client, "IsConnected") is False
 
 
 @pytest.mark.parametrize("fault, count", [
