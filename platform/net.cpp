@@ -133,6 +133,32 @@ bool Resolve(const std::string& host, int port, bool passive, Addresses& out, st
   return true;
 }
 
+// A connection's options: small frames go out at once, a closed peer is an error rather than a
+// signal, and a peer that vanished without closing (its machine off, its network gone) is found by
+// keep-alive probes after a minute of silence, within two minutes more.
+template <class Handle>
+void Tune(Handle handle) {
+  auto set = [handle](int level, int name, int value) {
+    setsockopt(handle, level, name, reinterpret_cast<const char*>(&value), sizeof value);
+  };
+  set(IPPROTO_TCP, TCP_NODELAY, 1);
+#ifdef SO_NOSIGPIPE
+  set(SOL_SOCKET, SO_NOSIGPIPE, 1);
+#endif
+  set(SOL_SOCKET, SO_KEEPALIVE, 1);
+#if defined(TCP_KEEPIDLE)
+  set(IPPROTO_TCP, TCP_KEEPIDLE, 60);
+#elif defined(TCP_KEEPALIVE)
+  set(IPPROTO_TCP, TCP_KEEPALIVE, 60);
+#endif
+#ifdef TCP_KEEPINTVL
+  set(IPPROTO_TCP, TCP_KEEPINTVL, 10);
+#endif
+#ifdef TCP_KEEPCNT
+  set(IPPROTO_TCP, TCP_KEEPCNT, 12);
+#endif
+}
+
 }  // namespace
 
 Socket Socket::Connect(const std::string& host, int port, Clock::duration timeout, std::string& error) {
@@ -161,11 +187,7 @@ Socket Socket::Connect(const std::string& host, int port, Clock::duration timeou
     }
     if (code != 0) continue;
     SetBlocking(s.handle_, true);
-    int one = 1;
-    setsockopt(s.handle_, IPPROTO_TCP, TCP_NODELAY, reinterpret_cast<const char*>(&one), sizeof one);
-#ifdef SO_NOSIGPIPE
-    setsockopt(s.handle_, SOL_SOCKET, SO_NOSIGPIPE, &one, sizeof one);
-#endif
+    Tune(s.handle_);
     error.clear();
     return s;
   }
@@ -208,13 +230,7 @@ int Socket::LocalPort() const {
 Socket Socket::Accept(Clock::duration timeout) {
   if (!Wait(false, Clock::now() + timeout)) return {};
   Socket s(static_cast<Handle>(::accept(handle_, nullptr, nullptr)));
-  if (s.valid()) {
-    int one = 1;
-    setsockopt(s.handle_, IPPROTO_TCP, TCP_NODELAY, reinterpret_cast<const char*>(&one), sizeof one);
-#ifdef SO_NOSIGPIPE
-    setsockopt(s.handle_, SOL_SOCKET, SO_NOSIGPIPE, &one, sizeof one);
-#endif
-  }
+  if (s.valid()) Tune(s.handle_);
   return s;
 }
 
