@@ -17,6 +17,7 @@
 #include <dirent.h>
 #include <sys/stat.h>
 #include <sys/types.h>
+#include <unistd.h>
 #endif
 
 #include "platform/net.h"
@@ -62,6 +63,14 @@ FileKind KindOfMode(mode_t mode) {
 }
 #endif
 
+unsigned long ProcessId() {
+#ifdef _WIN32
+  return GetCurrentProcessId();
+#else
+  return static_cast<unsigned long>(getpid());
+#endif
+}
+
 }  // namespace
 
 bool ReadFile(const std::string& path, std::string& contents, std::uintmax_t limit) {
@@ -77,7 +86,9 @@ bool ReadFile(const std::string& path, std::string& contents, std::uintmax_t lim
 
 bool WriteFileAtomically(const std::string& path, const std::string& contents) {
   static std::atomic<unsigned> serial{0};
-  std::string temporary = path + ".partial" + std::to_string(serial++);
+  // Named for this process and this write: two applications saving to one path at once each write
+  // a file of their own, and the last to finish replaces the other's whole.
+  std::string temporary = path + ".partial" + std::to_string(ProcessId()) + "-" + std::to_string(serial++);
   {
     std::ofstream out(Native(temporary), std::ios::binary | std::ios::trunc);
     if (!out || !out.write(contents.data(), static_cast<std::streamsize>(contents.size())) || !out.flush()) {
