@@ -29,8 +29,6 @@ namespace {
 constexpr auto kHelloTime = std::chrono::seconds(10);
 // A frame, once begun, must arrive whole within this time.
 constexpr auto kFrameTime = std::chrono::seconds(30);
-// A payload's buffer larger than this is let go after its request.
-constexpr std::size_t kKeptBuffer = 1 << 20;
 
 struct Shared {
   Scene& scene;
@@ -183,7 +181,8 @@ void ServeClient(Shared& shared, Client& client) {
   Throttle throttle(shared.options.rate);
   if (Handshake(socket, shared.options)) {
     for (;;) {
-      if (payload.capacity() > kKeptBuffer) std::vector<char>().swap(payload);
+      protocol::Trim(payload);
+      reply.Trim();
       Got got = ReadFrame(socket, payload, shared.options.maxFrame, Clock::time_point::max());
       if (got == Got::TooLarge) {
         SendRefusal(socket, "a frame may hold at most " + std::to_string(shared.options.maxFrame) + " bytes");

@@ -89,6 +89,12 @@ bool ParseAddress(std::string const& text, Address& out) {
 ClientConnection::Call::Call(ClientConnection& connection, Id id)
     : lock_(connection.mutex_), connection_(connection), command_(id) {}
 
+// Buffers that one large request or reply grew are let go before the connection is unlocked.
+ClientConnection::Call::~Call() {
+  connection_.request_.Trim();
+  client3::protocol::Trim(connection_.reply_);
+}
+
 bool ClientConnection::Call::Begin() {
   if (!connection_.socket_.valid()) return false;
   id_ = ++connection_.lastId_;

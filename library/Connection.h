@@ -36,6 +36,9 @@ public:
     ResultCode::Enum Exchange(std::string& message);
     client3::protocol::Reader outputs() const { return {connection_.reply_.data() + outputsAt_, connection_.reply_.size() - outputsAt_}; }
 
+    ~Call();
+    Call(const Call&) = delete;
+
   private:
     friend class ClientConnection;
     Call(ClientConnection& connection, client3::protocol::Id id);

@@ -33,6 +33,14 @@ inline constexpr std::uint16_t kVersion = 1;
 // The largest payload either side accepts (a 1,000,000-frame trajectory is about 25 MiB).
 inline constexpr std::uint32_t kMaxFrame = 64u << 20;
 inline constexpr std::size_t kHeaderSize = 4;
+// A frame buffer that grew past this for one large frame is let go once that frame is done with.
+inline constexpr std::size_t kKeptBuffer = 1 << 20;
+
+// Lets go of `buffer` when one large frame grew it past kKeptBuffer.
+template <class Buffer>
+void Trim(Buffer& buffer) {
+  if (buffer.capacity() > kKeptBuffer) Buffer().swap(buffer);
+}
 
 enum Kind : char { Hello = 'H', Request = 'Q', Reply = 'R', Refusal = 'E' };
 
@@ -178,6 +186,10 @@ public:
     return {bytes_.data(), bytes_.size()};
   }
   std::size_t size() const { return bytes_.size(); }
+  // Lets go of a buffer that one large frame grew; the frame is to be begun again with Clear.
+  void Trim() {
+    if (bytes_.capacity() > kKeptBuffer) std::vector<char>(kHeaderSize).swap(bytes_);
+  }
 
 private:
   void Tag(Type type) { Raw(static_cast<std::uint8_t>(type)); }

@@ -629,6 +629,16 @@ def test_a_reply_announced_and_never_sent_takes_no_memory(start_host, clients):
     assert call(client, "IsConnected") is False
 
 
+def test_the_buffer_of_a_large_reply_is_let_go(start_host, clients):
+    in_use = repeat.heap_meter()
+    if in_use is None:
+        pytest.skip("the C heap's use is not measurable here")
+    client = clients(start_host("--frames", "1000000"))
+    before = in_use()
+    m.delete_Output_GetTrajectory(ok(call(client, "GetTrajectory", "Alice", "LANK")))
+    assert in_use() - before < 1 << 20  # the reply is 25 MiB
+
+
 @pytest.mark.parametrize("fault, count", [
     ("delay=1000@GetFrameCount", 0), ("garbage@GetFrameCount", 0), ("text@GetFrameCount", 0),
     ("status=1003@GetFrameCount", 0), ("close@GetFrameCount", 0), ("oversize@GetFrameCount", 0),
