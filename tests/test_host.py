@@ -744,6 +744,18 @@ def test_misbehaving_peer_is_refused_and_closed(start_host, clients, commands, s
     assert_serves(host, clients)
 
 
+def test_a_frame_begun_must_end_within_30_seconds(start_host, clients, commands):
+    host = start_host()
+    with raw_connection(host) as sock:
+        shake_hands(sock, len(commands))
+        sock.sendall(struct.pack("<I", 100) + b"Q")  # 99 of its bytes never come
+        started = time.monotonic()
+        sock.settimeout(45)
+        assert read_frame(sock) is None
+        assert 29 < time.monotonic() - started < 45
+    assert_serves(host, clients)
+
+
 MALFORMED = [
     # the request, given the list of commands; the code and message of its reply (None: no such command)
     (lambda c: request(7, len(c)), m.ApplicationError, None),
