@@ -25,6 +25,7 @@ HERE = os.path.dirname(os.path.abspath(__file__))
 FRAMES = 200
 TAKES = 6
 WAIT = 60  # seconds any one process may take to start, finish or stop
+CLOSE = 20  # seconds a cluster may take to close (it takes one or two)
 KILLING = ("--fault", "exit=2@OfflineFixOcclusion")  # every application ends at its second fix
 MARKER = "CLIENT3_BATCH_TEST"
 
@@ -82,9 +83,22 @@ def dask_cluster():
             yield client
     finally:
         try:
-            cluster.close()
-        except RuntimeError:  # seen once on 3.9: Dask's own wait on its event loop failed; the workers end with the run
+            cluster.close(timeout=CLOSE)
+        except Exception:  # seen on 3.9: a worker that Dask had started again never took the close
+            stop_worker_processes()
+
+
+def stop_worker_processes():
+    """Kills the worker processes of this test process's clusters; their applications end with them."""
+    workers = []
+    for process in psutil.Process().children(recursive=True):
+        try:
+            if "spawn_main" in " ".join(process.cmdline()):
+                workers.append(process)
+                process.kill()
+        except psutil.Error:  # already gone
             pass
+    psutil.wait_procs(workers, timeout=WAIT)
 
 
 @pytest.fixture(params=["pool", "dask"])
