@@ -169,10 +169,6 @@ inline void Put(Writer& w, std::vector<Type_Parameter> const& v) {
 // Thrown when a value that should be a number came as a text that is not one.
 struct NotNumeric {};
 
-inline SafeString Owned(std::string_view text) {
-  return SafeString(VStringFactory::Instance(), std::string(text).c_str());
-}
-
 // Gives `target` its own copy of `text`: one duplication, where assigning a new SafeString makes two.
 inline void Own(SafeString& target, char const* text) {
   SafeString made(VStringFactory::Instance(), text);
@@ -180,6 +176,7 @@ inline void Own(SafeString& target, char const* text) {
   std::swap(target.ViewText, made.ViewText);
   std::swap(target.Factory, made.Factory);
 }
+inline void Own(SafeString& target, std::string_view text) { Own(target, std::string(text).c_str()); }
 
 // A number, also accepted as its text.
 template <class T>
@@ -208,13 +205,17 @@ void Read(Reader& r, T& out) {
   if constexpr (std::is_arithmetic_v<T>) {
     out = Number<T>(r);
   } else if constexpr (std::is_same_v<T, SafeString>) {
-    Own(out, std::string(r.Text()).c_str());
+    Own(out, r.Text());
   } else if constexpr (std::is_same_v<T, std::vector<SafeString>>) {
     out.clear();
-    r.GetTexts([&](std::string_view text) { out.emplace_back(VStringFactory::Instance(), std::string(text).c_str()); });
+    r.GetTexts([&](std::string_view text) { Own(out.emplace_back(), text); });
   } else if constexpr (std::is_same_v<T, std::vector<Type_Parameter>>) {
     out.clear();
-    r.GetPairs([&](std::string_view name, std::string_view value) { out.push_back({Owned(name), Owned(value)}); });
+    r.GetPairs([&](std::string_view name, std::string_view value) {
+      Type_Parameter& parameter = out.emplace_back();
+      Own(parameter.Name, name);
+      Own(parameter.Value, value);
+    });
   } else if constexpr (std::is_same_v<T, std::vector<int>>) {
     std::vector<std::int32_t> values;
     r.Get(values);

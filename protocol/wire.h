@@ -37,9 +37,8 @@ inline constexpr std::size_t kHeaderSize = 4;
 inline constexpr std::size_t kKeptBuffer = 1 << 20;
 
 // Lets go of `buffer` when one large frame grew it past kKeptBuffer.
-template <class Buffer>
-void Trim(Buffer& buffer) {
-  if (buffer.capacity() > kKeptBuffer) Buffer().swap(buffer);
+inline void Trim(std::vector<char>& buffer) {
+  if (buffer.capacity() > kKeptBuffer) std::vector<char>().swap(buffer);
 }
 
 enum Kind : char { Hello = 'H', Request = 'Q', Reply = 'R', Refusal = 'E' };
