@@ -88,7 +88,9 @@ def test_new_safe_string_keeps_each_text_once():
     before = in_use()
     for text in texts * 10_000:
         _Client3.new_SafeString(text)
-    assert in_use() - before < 16_384  # a copy per call would be 30,000 copies, about a megabyte
+    # A copy per call would be 30,000 copies, a megabyte at the least; the interpreter itself may take a
+    # block of its own meanwhile (32 KiB was seen on 3.13).
+    assert in_use() - before < 256 << 10
     # Each view shows its text.
     assert [_Client3.SafeString_Value(_Client3.new_SafeString(text)) for text in texts] == texts
 
