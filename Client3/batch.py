@@ -186,21 +186,27 @@ def _worker_start() -> None:
 
 def _pool_results(job: Job, takes: Sequence[Tuple[str, str]], workers: int, retries: int,
                   options: Tuple[str, ...]) -> Iterator[Result]:
-    """The standard library's process pool. A worker process that ends abruptly breaks the pool: the
-    unfinished takes go to a new pool, and those that were running (their mark files are left) count
-    it as an attempt, at most `retries` more times."""
+    """The standard library's process pool. A worker process that ends abruptly breaks the pool, and
+    every take then running (their mark files are left) ends with it; the unfinished takes go to a
+    new pool. When one take was running, its end counts as an attempt, at most `retries` more times.
+    When several were, which of them ended its process is not known: each is run again by itself,
+    before the others, so that no take is charged for another's end."""
     attempts: Dict[str, int] = {}
     todo = list(takes)
+    alone: List[Tuple[str, str]] = []  # run one at a time
     marks = tempfile.TemporaryDirectory(prefix="client3-batch-")
     with marks:
-        while todo:
-            pool = ProcessPoolExecutor(workers, mp_context=multiprocessing.get_context("spawn"),
+        while todo or alone:
+            by_itself = bool(alone)
+            round_takes, round_workers = (alone, 1) if by_itself else (todo, workers)
+            pool = ProcessPoolExecutor(round_workers, mp_context=multiprocessing.get_context("spawn"),
                                        initializer=_worker_start)
             pending: Dict[Future, Tuple[str, str, str]] = {}  # type: ignore[type-arg]
-            for index, (take, path) in enumerate(todo):
+            for index, (take, path) in enumerate(round_takes):
                 mark = os.path.join(marks.name, str(index))
                 pending[pool.submit(run_take, job, take, path, retries, options, "", mark)] = (take, path, mark)
-            todo = []
+            unfinished: List[Tuple[str, str]] = []
+            running: List[Tuple[str, str]] = []
             try:
                 while pending:
                     finished, _ = wait(pending, return_when=FIRST_COMPLETED)
@@ -211,16 +217,21 @@ def _pool_results(job: Job, takes: Sequence[Tuple[str, str]], workers: int, retr
                         except BrokenProcessPool:
                             if os.path.exists(mark):
                                 os.remove(mark)
-                                attempts[take] = attempts.get(take, 0) + 1
-                            if attempts.get(take, 0) > retries:
-                                yield Result(take, False, "the worker process ended during the take", 0.0, "",
-                                             attempts[take])
+                                running.append((take, path))
                             else:
-                                todo.append((take, path))
+                                unfinished.append((take, path))
             finally:
                 for future in pending:
                     future.cancel()
                 pool.shutdown(wait=True)
+            todo, alone = (todo, unfinished) if by_itself else (unfinished, [])
+            if len(running) == 1:
+                take, path = running[0]
+                attempts[take] = attempts.get(take, 0) + 1
+                if attempts[take] > retries:
+                    yield Result(take, False, "the worker process ended during the take", 0.0, "", attempts[take])
+                    continue
+            alone[:0] = running
 
 
 def _done(out: str) -> Set[str]:
