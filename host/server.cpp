@@ -89,9 +89,12 @@ bool Handshake(Socket& socket, const Options& options) {
     if (std::memcmp(magic, protocol::kMagic, sizeof magic) != 0) throw DecodeError("");
     auto version = hello.Raw<std::uint16_t>();
     auto count = hello.Raw<std::uint16_t>();
-    if (!TokenMatches(hello.RawText(), options.token)) {
-      LogLine("warning", "a client was refused: it did not give the access token");
-      SendRefusal(socket, "the application needs its access token, and the client did not give it");
+    std::string_view token = hello.RawText();
+    if (!TokenMatches(token, options.token)) {
+      LogLine("warning", token.empty() ? "a client was refused: it did not give the access token"
+                                       : "a client was refused: it gave a wrong access token");
+      SendRefusal(socket, token.empty() ? "the application needs its access token, and the client did not give it"
+                                        : "the access token the client gave is not the application's");
       return false;
     }
     if (version != protocol::kVersion || count != protocol::kCommandCount) {

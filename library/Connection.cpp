@@ -62,7 +62,9 @@ bool ParseMilliseconds(std::string_view text, std::chrono::milliseconds& out) {
   return true;
 }
 
-bool ParseAddress(std::string const& text, Address& out) {
+// Reads `text` into `out`; the reason it is not an address, or empty when it is one. Of the values,
+// only a time limit's is repeated in the reason: another could be a token.
+std::string ParseAddress(std::string const& text, Address& out) {
   if (const char* token = std::getenv("CLIENT3_TOKEN")) out.token = token;
   std::size_t query = text.find('?');
   std::string host = text.substr(0, query);
@@ -72,16 +74,24 @@ bool ParseAddress(std::string const& text, Address& out) {
     std::size_t next = text.find('&', query + 1);
     std::string option = text.substr(query + 1, next == std::string::npos ? std::string::npos : next - query - 1);
     std::size_t equals = option.find('=');
-    if (equals == std::string::npos) return false;
     std::string key = option.substr(0, equals);
+    if (key != "token" && key != "timeout" && key != "connect")
+      return "'" + key + "' is not an address option (they are timeout=MS, connect=MS and token=TEXT)";
+    if (equals == std::string::npos) return "the address option '" + key + "' has no value";
     std::string_view value = std::string_view(option).substr(equals + 1);
     if (key == "token")
       out.token = value;
-    else if ((key != "timeout" && key != "connect") || !ParseMilliseconds(value, key == "timeout" ? out.reply : out.connect))
-      return false;
+    else if (!ParseMilliseconds(value, key == "timeout" ? out.reply : out.connect))
+      return "the address option '" + key + "' takes a whole number of milliseconds, not '" + std::string(value) + "'";
     query = next;
   }
-  return true;
+  return {};
+}
+
+// "host:port", with an IPv6 address in brackets.
+std::string Place(std::string const& host, int port) {
+  bool v6 = host.find(':') != std::string::npos;
+  return (v6 ? "[" + host + "]" : host) + ":" + std::to_string(port);
 }
 
 }  // namespace
@@ -170,17 +180,33 @@ ResultCode::Enum ClientConnection::Call::Exchange(std::string& message) {
   }
 }
 
+// A failed Connect's text is the code's own, then where it tried and why it failed there.
 ResultCode::Enum ClientConnection::Open(std::string const& text, int port, std::string& message) {
   std::lock_guard<std::mutex> lock(mutex_);
   socket_.Close();
   Address address;
-  if (!ParseAddress(text, address)) {
-    message = "'" + text + "' is not an address of the form host?timeout=MS&connect=MS&token=TEXT";
-    return ResultCode::NotConnected;
-  }
+  std::string problem = ParseAddress(text, address);
   if (port <= 0) port = kDefaultPort;
-  socket_ = client3::platform::Socket::Connect(address.host, port, address.connect, message);
-  if (!socket_.valid()) return ResultCode::NotConnected;
+  std::string place = Place(address.host, port);
+  auto fail = [&](ResultCode::Enum code, std::string const& why) {
+    socket_.Close();
+    message = std::string(ResultText(code)) + " " + place + " " + why;
+    return code;
+  };
+  if (!problem.empty()) return fail(ResultCode::NotConnected, "was not tried: " + problem);
+  if (port > 65535)
+    return fail(ResultCode::NotConnected, "was not tried: a port is a number from 1 to 65535 (0 or less for " + std::to_string(kDefaultPort) + ")");
+  std::string waited = std::to_string(address.connect.count()) + " ms";
+  client3::platform::ConnectFailure failure;
+  socket_ = client3::platform::Socket::Connect(address.host, port, address.connect, failure);
+  switch (failure.cause) {
+    case client3::platform::ConnectFailure::None: break;
+    case client3::platform::ConnectFailure::NameNotFound: return fail(ResultCode::NotConnected, "was not found: no host has that name");
+    case client3::platform::ConnectFailure::Lookup: return fail(ResultCode::NotConnected, "could not be looked up: " + failure.detail);
+    case client3::platform::ConnectFailure::Refused: return fail(ResultCode::NotConnected, "refused the connection");
+    case client3::platform::ConnectFailure::TimedOut: return fail(ResultCode::NotConnected, "did not answer within " + waited);
+    case client3::platform::ConnectFailure::Other: return fail(ResultCode::NotConnected, "could not be reached: " + failure.detail);
+  }
   replyTimeout_ = address.reply;
 
   Writer& hello = request_;
@@ -190,26 +216,27 @@ ResultCode::Enum ClientConnection::Open(std::string const& text, int port, std::
   hello.Raw(static_cast<std::uint16_t>(kCommandCount));
   hello.RawText(address.token);
   std::string_view frame = hello.Finish();
-  if (!socket_.SendAll(frame.data(), frame.size())) return Lost();
-  ResultCode::Enum code = Receive(Clock::now() + address.connect);
-  if (code != ResultCode::Success) {
-    socket_.Close();
-    return code == ResultCode::RequestTimedOut ? ResultCode::NotConnected : code;
+  // A hello that cannot be sent is not the end: the application may have refused the client and
+  // closed already, and its refusal is still to be read.
+  socket_.SendAll(frame.data(), frame.size());
+  switch (Receive(Clock::now() + address.connect)) {
+    case ResultCode::Success: break;
+    case ResultCode::NotConnected: return fail(ResultCode::NotConnected, "closed the connection without answering");
+    case ResultCode::ReplyParsingError: return fail(ResultCode::ReplyParsingError, "does not speak the application's protocol");
+    default: return fail(ResultCode::NotConnected, "took the connection but did not answer within " + waited);
   }
   try {
     Reader reader(reply_.data(), reply_.size());
     auto kind = reader.Raw<char>();
-    if (kind == Refusal) {
-      message = reader.RawText();
-      socket_.Close();
-      return ResultCode::ApplicationError;
-    }
-    if (kind != Hello || reader.Raw<std::uint16_t>() != kVersion || reader.Raw<std::uint16_t>() != kCommandCount)
-      throw DecodeError("the application speaks another version of the protocol");
-  } catch (const DecodeError& error) {
-    message = error.what();
-    socket_.Close();
-    return ResultCode::ReplyParsingError;
+    if (kind == Refusal) return fail(ResultCode::ApplicationError, "refused the client: " + std::string(reader.RawText()));
+    if (kind != Hello) throw DecodeError("");
+    auto version = reader.Raw<std::uint16_t>(), commands = reader.Raw<std::uint16_t>();
+    if (version != kVersion || commands != kCommandCount)
+      return fail(ResultCode::ReplyParsingError, "speaks version " + std::to_string(version) + " of the protocol with " +
+                                                     std::to_string(commands) + " commands, not version " +
+                                                     std::to_string(kVersion) + " with " + std::to_string(kCommandCount));
+  } catch (const DecodeError&) {
+    return fail(ResultCode::ReplyParsingError, "does not speak the application's protocol");
   }
   message.clear();
   return ResultCode::Success;

@@ -32,7 +32,8 @@ public:
     // arguments then need no writing).
     bool Begin();
     // Sends the request and waits for its reply. On Success, `outputs()` reads the reply's values;
-    // `message` is the application's text (empty when it sent none).
+    // `message` is the application's text: why it refused, or on success what the command did
+    // (empty when it sent none).
     ResultCode::Enum Exchange(std::string& message);
     client3::protocol::Reader outputs() const { return {connection_.reply_.data() + outputsAt_, connection_.reply_.size() - outputsAt_}; }
 
@@ -51,7 +52,8 @@ public:
 
   Call Start(client3::protocol::Id id) { return Call(*this, id); }
 
-  // Connects and shakes hands; the message tells what went wrong.
+  // Connects and shakes hands. On failure `message` is the code's text, then the address, the port
+  // and the cause ("... 127.0.0.1:8870 refused the connection").
   ResultCode::Enum Open(std::string const& address, int port, std::string& message);
   void Close();
   bool Connected() const;

@@ -32,8 +32,7 @@ Output_Result C::Connect(SafeString const& address, int port) {
   Output_Result result{};
   std::string message;
   ResultCode::Enum code = m_Connection->Open(address, port, message);
-  // The reason for a failed connection is the library's own: the code's text is what scripts see.
-  request::SetResult(result, code, code == ResultCode::ApplicationError ? message : std::string());
+  request::SetResult(result, code, message);
   return result;
 }
 

@@ -119,18 +119,45 @@ struct Addresses {
   }
 };
 
-bool Resolve(const std::string& host, int port, bool passive, Addresses& out, std::string& error) {
+// Looks host:port up; the resolver's code, 0 when it found addresses.
+int Resolve(const std::string& host, int port, bool passive, Addresses& out) {
   addrinfo hints{};
   hints.ai_family = AF_UNSPEC;
   hints.ai_socktype = SOCK_STREAM;
   hints.ai_flags = passive ? AI_PASSIVE : 0;
   std::string service = std::to_string(port);
-  int code = getaddrinfo(host.empty() ? nullptr : host.c_str(), service.c_str(), &hints, &out.list);
-  if (code != 0) {
-    error = "cannot resolve '" + host + "'";
-    return false;
-  }
-  return true;
+  return getaddrinfo(host.empty() ? nullptr : host.c_str(), service.c_str(), &hints, &out.list);
+}
+
+bool NameNotFound(int code) {
+#ifdef EAI_NODATA
+  if (code == EAI_NODATA) return true;
+#endif
+  return code == EAI_NONAME;
+}
+
+// The resolver's words for its failure `code` (on Windows its codes are the sockets' own).
+std::string ResolverText(int code) {
+#ifdef _WIN32
+  return Describe(code);
+#else
+  return code == EAI_SYSTEM ? Describe(errno) : gai_strerror(code);
+#endif
+}
+
+#ifdef _WIN32
+bool Refused(int error) { return error == WSAECONNREFUSED; }
+bool TimedOut(int error) { return error == WSAETIMEDOUT; }
+#else
+bool Refused(int error) { return error == ECONNREFUSED; }
+bool TimedOut(int error) { return error == ETIMEDOUT; }
+#endif
+
+// A failed connection attempt's cause from the system's error.
+ConnectFailure FailureOf(int error) {
+  if (Refused(error)) return {ConnectFailure::Refused, {}};
+  if (TimedOut(error)) return {ConnectFailure::TimedOut, {}};
+  return {ConnectFailure::Other, Describe(error)};
 }
 
 // A connection's options: small frames go out at once, a closed peer is an error rather than a
@@ -161,34 +188,40 @@ void Tune(Handle handle) {
 
 }  // namespace
 
-Socket Socket::Connect(const std::string& host, int port, Clock::duration timeout, std::string& error) {
+Socket Socket::Connect(const std::string& host, int port, Clock::duration timeout, ConnectFailure& failure) {
   EnsureStarted();
   Addresses addresses;
-  if (!Resolve(host, port, false, addresses, error)) return {};
+  if (int code = Resolve(host, port, false, addresses)) {
+    failure = NameNotFound(code) ? ConnectFailure{ConnectFailure::NameNotFound, {}} : ConnectFailure{ConnectFailure::Lookup, ResolverText(code)};
+    return {};
+  }
   Clock::time_point deadline = Clock::now() + timeout;
-  error = "no address for '" + host + "'";
+  failure = {ConnectFailure::NameNotFound, {}};
   for (addrinfo* a = addresses.list; a; a = a->ai_next) {
     Socket s(static_cast<Handle>(::socket(a->ai_family, a->ai_socktype, a->ai_protocol)));
-    if (!s.valid()) continue;
+    if (!s.valid()) {
+      failure = FailureOf(LastError());
+      continue;
+    }
     SetBlocking(s.handle_, false);
     int code = ::connect(s.handle_, a->ai_addr, static_cast<Length>(a->ai_addrlen));
     if (code != 0 && InProgress(LastError())) {
       if (!s.Wait(true, deadline)) {
-        error = "no answer from " + host + ":" + std::to_string(port) + " in time";
+        failure = {ConnectFailure::TimedOut, {}};
         continue;
       }
-      int failure = 0;
-      Length size = sizeof failure;
-      getsockopt(s.handle_, SOL_SOCKET, SO_ERROR, reinterpret_cast<char*>(&failure), &size);
-      code = failure == 0 ? 0 : -1;
-      if (failure) error = Describe(failure);
+      int error = 0;
+      Length size = sizeof error;
+      getsockopt(s.handle_, SOL_SOCKET, SO_ERROR, reinterpret_cast<char*>(&error), &size);
+      code = error == 0 ? 0 : -1;
+      if (error) failure = FailureOf(error);
     } else if (code != 0) {
-      error = Describe(LastError());
+      failure = FailureOf(LastError());
     }
     if (code != 0) continue;
     SetBlocking(s.handle_, true);
     Tune(s.handle_);
-    error.clear();
+    failure = {};
     return s;
   }
   return {};
@@ -197,7 +230,10 @@ Socket Socket::Connect(const std::string& host, int port, Clock::duration timeou
 Socket Socket::Listen(const std::string& host, int port, std::string& error) {
   EnsureStarted();
   Addresses addresses;
-  if (!Resolve(host, port, true, addresses, error)) return {};
+  if (int code = Resolve(host, port, true, addresses)) {
+    error = "cannot resolve '" + host + "': " + ResolverText(code);
+    return {};
+  }
   for (addrinfo* a = addresses.list; a; a = a->ai_next) {
     Socket s(static_cast<Handle>(::socket(a->ai_family, a->ai_socktype, a->ai_protocol)));
     if (!s.valid()) continue;

@@ -18,6 +18,14 @@ using Clock = std::chrono::steady_clock;
 // TimedOut: nothing arrived in time; Stalled: part of the bytes arrived, the rest did not.
 enum class Io { Done, TimedOut, Stalled, Closed };
 
+// Why a connection could not be made, alike on every system: the name is not known, the name could
+// not be looked up (the resolver's words in `detail`), nothing listens on the port, nothing
+// answered in time, or another reason in the system's words.
+struct ConnectFailure {
+  enum Cause { None, NameNotFound, Lookup, Refused, TimedOut, Other } cause = None;
+  std::string detail;
+};
+
 class Socket {
 public:
   Socket() = default;
@@ -35,8 +43,8 @@ public:
   Socket& operator=(const Socket&) = delete;
 
   // A connection to host:port, given up after `timeout`. On failure the socket is closed and
-  // `error` says why.
-  static Socket Connect(const std::string& host, int port, Clock::duration timeout, std::string& error);
+  // `failure` says why (for a name with several addresses, why the last one failed).
+  static Socket Connect(const std::string& host, int port, Clock::duration timeout, ConnectFailure& failure);
   // A listening socket on host:port (port 0: one the system picks).
   static Socket Listen(const std::string& host, int port, std::string& error);
 

@@ -17,6 +17,8 @@ from appclient import Client
 
 TOKEN = "correct horse"
 NEEDS_TOKEN = "the application needs its access token, and the client did not give it"
+WRONG_TOKEN = "the access token the client gave is not the application's"
+APPLICATION_ERROR = "Host application encountered an error processing the request."
 
 
 def with_options(host, options):
@@ -77,9 +79,11 @@ def test_access_token(start_host, monkeypatch, host_from_env, options, client_en
         monkeypatch.setenv("CLIENT3_TOKEN", client_env)
     if accepted:
         assert connect(host, options) == (m.Success, "OK", True, 1000)
-    else:
-        assert connect(host, options) == (m.ApplicationError, NEEDS_TOKEN, False, 0)
-        assert " warning a client was refused: it did not give the access token\n" in host.log()
+        return
+    given = options.partition("token=")[2] or client_env
+    refusal, logged = (WRONG_TOKEN, "it gave a wrong access token") if given else (NEEDS_TOKEN, "it did not give the access token")
+    assert connect(host, options) == (m.ApplicationError, f"{APPLICATION_ERROR} 127.0.0.1:{host.port} refused the client: {refusal}", False, 0)
+    assert f" warning a client was refused: {logged}\n" in host.log()
 
 
 def test_host_without_a_token_takes_any(host, monkeypatch):
@@ -97,7 +101,7 @@ def test_no_command_runs_before_the_token_is_checked(start_host):
     with socket.create_connection((host.address, host.port), timeout=5) as sock:
         # The hello and a request in one write: the request must never run.
         sock.sendall(frame(hello) + frame(rename))
-        assert receive_all(sock) == frame(b"E" + struct.pack("<I", len(NEEDS_TOKEN)) + NEEDS_TOKEN.encode())
+        assert receive_all(sock) == frame(b"E" + struct.pack("<I", len(WRONG_TOKEN)) + WRONG_TOKEN.encode())
     assert app.GetSceneName()[0] == "Demo"
     app.close()
 
