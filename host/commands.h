@@ -59,6 +59,9 @@ struct Context {
   // For a stage: its shared hold on the scene, to be traded for the exclusive one while it writes.
   // Null when the command already holds the scene alone.
   std::shared_lock<SceneLock>* reading = nullptr;
+  // What the command did, in one line, for the message of its reply when it succeeds: set by the
+  // processing stages and the filters, empty for every other command.
+  std::string summary;
 };
 
 // Runs `write` with the scene held alone, then shares it again.

@@ -2,6 +2,7 @@
 // each stretch of consecutive keyed frames on its own, so that values never cross a gap, and both
 // check every constant before they change anything.
 #include <algorithm>
+#include <charconv>
 #include <cmath>
 
 #include "host/handlers.h"
@@ -51,6 +52,14 @@ Target TargetOf(Scene& scene, Reader& in) {
   return target;
 }
 
+// A value given as a float, in the shortest form that reads back as that float ("0.1", not
+// "0.10000000149011612").
+std::string FloatText(double value) {
+  char text[32];
+  auto [end, error] = std::to_chars(text, text + sizeof text, static_cast<float>(value));
+  return std::string(text, error == std::errc() ? end : text);
+}
+
 // The kernel's length must be odd (so that it is centred on the frame it replaces) and no longer
 // than the take.
 void CheckLength(const Scene& scene, std::string_view what, std::int32_t length) {
@@ -59,10 +68,16 @@ void CheckLength(const Scene& scene, std::string_view what, std::int32_t length)
            std::to_string(length));
 }
 
+// How many samples (values of a channel at a frame) a filter replaced, how many of those took another
+// value, and how many it left as they were in stretches too short for its kernel.
+struct Tally {
+  std::size_t filtered = 0, changed = 0, tooShort = 0;
+};
+
 // Replaces each usable keyed frame by the kernel's weighted sum of its neighbours. A stretch of
 // keyed frames is extended at both ends by its reflection through its end value; a stretch no
 // longer than half the kernel is left as it is.
-void Apply(Channel& c, const std::vector<bool>& usable, const std::vector<double>& kernel) {
+void Apply(Channel& c, const std::vector<bool>& usable, const std::vector<double>& kernel, Tally& tally) {
   std::size_t half = kernel.size() / 2, frames = c.values.size();
   std::vector<double> extended, result;
   for (std::size_t a = 0; a < frames;) {
@@ -73,6 +88,7 @@ void Apply(Channel& c, const std::vector<bool>& usable, const std::vector<double
     std::size_t b = a;
     while (b < frames && c.keys[b] && usable[b]) ++b;
     std::size_t length = b - a;
+    if (length <= half) tally.tooShort += length;
     if (length > half) {
       extended.clear();
       for (std::size_t j = half; j >= 1; --j) extended.push_back(2 * c.values[a] - c.values[a + j]);
@@ -83,11 +99,25 @@ void Apply(Channel& c, const std::vector<bool>& usable, const std::vector<double
         double sum = 0;
         for (std::size_t k = 0; k < kernel.size(); ++k) sum += kernel[k] * extended[i + k];
         result[i] = sum;
+        tally.changed += sum != c.values[a + i];
       }
+      tally.filtered += length;
       std::copy(result.begin(), result.end(), c.values.begin() + static_cast<std::ptrdiff_t>(a));
     }
     a = b;
   }
+}
+
+// Filters every channel of the target; what it did, in one line, with `how` the filter in words.
+std::string ApplyAll(const Target& target, const std::vector<double>& kernel, const std::string& how) {
+  Tally tally;
+  for (Channel* c : target.channels) Apply(*c, target.usable, kernel, tally);
+  std::string summary = std::to_string(tally.changed) + " of " + Count(tally.filtered, "sample") + " changed in " +
+                        Count(target.channels.size(), "channel") + " (" + how + ")";
+  if (tally.tooShort)
+    summary += "; " + Count(tally.tooShort, "sample") + " in stretches of " + Count(kernel.size() / 2, "keyed frame") +
+               " or fewer left as they were";
+  return summary;
 }
 
 void Normalise(std::vector<double>& kernel) {
@@ -123,7 +153,8 @@ void FilterApplyFIR(Context& context, Reader& in, Writer&) {
     kernel[i] = 2 * fc * sinc * window;
   }
   Normalise(kernel);
-  for (Channel* c : target.channels) Apply(*c, target.usable, kernel);
+  context.summary = ApplyAll(target, kernel, "low-pass of " + Count(n, "tap") + ", cut-off " + FloatText(cutoff) + " Hz, transition " +
+                                                 FloatText(transition) + " Hz, sample rate " + FloatText(rate) + " Hz");
 }
 
 // Weighted moving average over Window frames: Weighting 0 gives every frame the same weight,
@@ -139,7 +170,7 @@ void FilterApplyWeightedAverage(Context& context, Reader& in, Writer&) {
   if (weighting == 1)
     for (std::size_t i = 0; i < n; ++i) kernel[i] = static_cast<double>(std::min(i, n - 1 - i) + 1);
   Normalise(kernel);
-  for (Channel* c : target.channels) Apply(*c, target.usable, kernel);
+  context.summary = ApplyAll(target, kernel, std::string(weighting ? "triangular" : "uniform") + " average over " + Count(n, "frame"));
 }
 
 constexpr HandlerEntry kHandlers[] = {

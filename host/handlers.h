@@ -4,6 +4,7 @@
 #pragma once
 
 #include <span>
+#include <string>
 
 #include "host/commands.h"
 
@@ -35,5 +36,12 @@ enum class SelectMode { Replace = 0, Add = 1, Remove = 2, Toggle = 3 };
 SelectMode ModeOf(int mode);
 // Applies a selection mode to per-item flags: `chosen` are the items the command names.
 void ApplyMode(std::vector<bool>& selected, const std::vector<bool>& chosen, SelectMode mode);
+
+// A count and its noun, for the one-line summaries of stages and filters: "1 gap", "3 gaps".
+inline std::string Count(std::size_t n, std::string_view one, std::string_view many = {}) {
+  std::string text = std::to_string(n) + " ";
+  if (n == 1) return text.append(one);
+  return many.empty() ? text.append(one).append(1, 's') : text.append(many);
+}
 
 }  // namespace client3::host

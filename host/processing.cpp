@@ -160,10 +160,11 @@ void SetText(Object& object, const std::string& name, std::string value) {
   p->value = std::move(value);
 }
 
-// What a stage works out while the scene is shared with readers: the result it records, and the
-// change it makes, written once it holds the scene alone.
+// What a stage works out while the scene is shared with readers: the result it records, what it did
+// in words (for the reply), and the change it makes, written once it holds the scene alone.
 struct Outcome {
   std::string result;
+  std::string summary;
   std::function<void()> write;
 };
 
@@ -243,7 +244,8 @@ Outcome LabelROM(Scene& scene, Object& subject, Progress& progress) {
         Refuse("markers '" + tracks[a].marker->name + "' and '" + tracks[b].marker->name + "' of " + Quoted(subject) +
                " lie closer together than the LabelROM setting 'SeparationDistance' (" + NumberText(separation) + " mm)");
   progress.Done();
-  return {"markers=" + std::to_string(tracks.size()) + ",frames=" + std::to_string(whole.size()), [tracks, labels] {
+  return {"markers=" + std::to_string(tracks.size()) + ",frames=" + std::to_string(whole.size()),
+          "label template of " + Count(tracks.size(), "marker") + " made from " + Count(whole.size(), "frame"), [tracks, labels] {
             for (std::size_t i = 0; i < tracks.size(); ++i)
               SetText(*tracks[i].marker, std::string(kTemplate), PointText(labels[i].offset) + "," + NumberText(labels[i].reach));
           }};
@@ -385,7 +387,9 @@ Outcome AutoLabel(Scene& scene, Object& subject, Progress& progress) {
   }
   progress.Done();
   std::string result = "labelled=" + std::to_string(assigned) + ",moved=" + std::to_string(moved) + ",dropped=" + std::to_string(dropped);
-  return {result, [order, results = std::move(results)] {
+  std::string summary = Count(assigned, "label") + " given, " + std::to_string(moved) + " of them to a point another marker held; " +
+                        Count(dropped, "point") + " dropped";
+  return {result, summary, [order, results = std::move(results)] {
             for (std::size_t i = 0; i < order.size(); ++i) {
               for (int a = 0; a < 3; ++a) {
                 Channel& c = *order[i].axes[a];
@@ -405,7 +409,7 @@ Outcome FixOcclusion(Scene& scene, Object& subject, Progress& progress) {
   double longest = std::floor(settings.Number(Record::OcclusionFixing, "TransitionTime") * scene.timeline.rate + 1e-9);
   bool apply = settings.Flag(Record::OcclusionFixing, "ApplyFixedMarkers");
   auto frames = static_cast<std::size_t>(scene.frames);
-  std::size_t rigid = 0, left = 0;
+  std::size_t rigid = 0, longer = 0, ends = 0;
   auto tracks = std::make_shared<std::vector<Track>>(TracksOf(scene, subject));
   // Every fill is worked out from the data as it was, then written.
   std::vector<Fill> fills;
@@ -420,7 +424,7 @@ Outcome FixOcclusion(Scene& scene, Object& subject, Progress& progress) {
       std::size_t end = f;
       while (end < frames && !t.Seen(end)) ++end;
       if (f == 0 || end == frames || static_cast<double>(end - f) > longest) {
-        ++left, f = end;
+        ++(f == 0 || end == frames ? ends : longer), f = end;
         continue;
       }
       Fill fill{&t, f, end, {}};
@@ -431,8 +435,14 @@ Outcome FixOcclusion(Scene& scene, Object& subject, Progress& progress) {
     }
   }
   progress.Done();
-  std::string result = "filled=" + std::to_string(fills.size()) + ",rigid=" + std::to_string(rigid) + ",left=" + std::to_string(left);
-  return {result, [tracks, fills = std::move(fills), apply] {
+  std::string result = "filled=" + std::to_string(fills.size()) + ",rigid=" + std::to_string(rigid) +
+                       ",left=" + std::to_string(longer + ends);
+  std::string summary = Count(fills.size(), "gap") + " filled (" + std::to_string(rigid) + " from a marker of the same segment, " +
+                        std::to_string(fills.size() - rigid) + " by cubic interpolation), " + std::to_string(longer + ends) +
+                        " left (" + std::to_string(longer) + " longer than " + Count(static_cast<std::size_t>(longest), "frame") +
+                        ", " + std::to_string(ends) + " at an end of the take)";
+  if (!apply) summary += "; the filled frames stay unseen (ApplyFixedMarkers is off)";
+  return {result, summary, [tracks, fills = std::move(fills), apply] {
             for (const Fill& fill : fills) {
               for (int a = 0; a < 3; ++a) {
                 Channel& c = *fill.track->axes[a];
@@ -510,7 +520,8 @@ Outcome CalibrateLabelingSubjects(Scene& scene, Object& subject, Progress& progr
   }
   if (!used) Refuse("no frame of the take sees every marker of " + Quoted(subject) + " that a constraint ties to a bone");
   progress.Done();
-  return {"constraints=" + std::to_string(tied.size()) + ",frames=" + std::to_string(used), [tied, sums, used] {
+  return {"constraints=" + std::to_string(tied.size()) + ",frames=" + std::to_string(used),
+          "offsets of " + Count(tied.size(), "constraint") + " set from " + Count(used, "frame"), [tied, sums, used] {
             for (std::size_t i = 0; i < tied.size(); ++i)
               tied[i].constraint->FindAttribute("Offset")->value = PointText(sums[i] * (1.0 / static_cast<double>(used)));
           }};
@@ -532,7 +543,8 @@ Outcome CreateSolvingSetup(Scene& scene, Object& subject) {
     ++constraints;
   }
   if (bones.empty()) Refuse(Quoted(subject) + " has no skeleton to solve");
-  return {"bones=" + std::to_string(bones.size()) + ",constraints=" + std::to_string(constraints), nullptr};
+  return {"bones=" + std::to_string(bones.size()) + ",constraints=" + std::to_string(constraints),
+          Count(bones.size(), "bone") + " and " + Count(constraints, "constraint") + " checked", nullptr};
 }
 
 // Solving-subject calibration: the Translation of each bone whose position and whose parent's are
@@ -555,7 +567,8 @@ Outcome CalibrateSolvingSubjects(Scene& scene, Object& subject, Progress& progre
   }
   progress.Done();
   std::size_t calibrated = static_cast<std::size_t>(std::count_if(counts.begin(), counts.end(), [](std::size_t n) { return n > 0; }));
-  return {"bones=" + std::to_string(segments.size()) + ",calibrated=" + std::to_string(calibrated), [segments, sums, counts] {
+  return {"bones=" + std::to_string(segments.size()) + ",calibrated=" + std::to_string(calibrated),
+          "translations of " + std::to_string(calibrated) + " of " + Count(segments.size(), "bone") + " set", [segments, sums, counts] {
             for (std::size_t i = 0; i < segments.size(); ++i)
               if (counts[i]) segments[i].bone->FindAttribute("Translation")->value = PointText(sums[i] * (1.0 / static_cast<double>(counts[i])));
           }};
@@ -618,7 +631,10 @@ Outcome Solve(Scene& scene, Object& subject, Progress& progress) {
     whole += all;
   }
   progress.Done();
-  return {"bones=" + std::to_string(segments.size()) + ",frames=" + std::to_string(whole), WritePaths(scene, std::move(paths), 0)};
+  return {"bones=" + std::to_string(segments.size()) + ",frames=" + std::to_string(whole),
+          Count(segments.size(), "bone") + " solved into TX, TY and TZ, every one of them placed at " + std::to_string(whole) + " of " +
+              Count(frames, "frame"),
+          WritePaths(scene, std::move(paths), 0)};
 }
 
 // Retargeting onto the model's standard figure, 1750 mm tall: each bone keeps the root bone's solved
@@ -655,7 +671,10 @@ Outcome Retarget(Scene& scene, Object& subject, Progress& progress) {
     paths.push_back(std::move(path));
   }
   progress.Done();
-  return {"bones=" + std::to_string(bones.size()) + ",scale=" + NumberText(scale), WritePaths(scene, std::move(paths), 3)};
+  return {"bones=" + std::to_string(bones.size()) + ",scale=" + NumberText(scale),
+          Count(bones.size(), "bone") + " retargeted into RX, RY and RZ, their offsets from the root scaled by " + NumberText(scale) +
+              " to the " + NumberText(kStandardHeight) + " mm figure",
+          WritePaths(scene, std::move(paths), 3)};
 }
 
 // ---- The pipeline -------------------------------------------------------------------------------
@@ -741,13 +760,17 @@ Outcome Compute(Context& context, Stage stage, Object* subject) {
     case Stage::CalibrateCameras: {
       std::size_t cameras = scene.OfType(scene.Root(), "Camera").size();
       if (cameras < 2) Refuse("'OfflineCalibrateCameras' needs at least two cameras in the scene, and there are " + std::to_string(cameras));
-      return {"cameras=" + std::to_string(cameras), nullptr};
+      return {"cameras=" + std::to_string(cameras), Count(cameras, "camera") + " counted; the take has no camera data, so nothing was calibrated",
+              nullptr};
     }
     case Stage::Reconstruct: {
       std::size_t markers = 0, seen = 0;
       for (Object* s : scene.OfType(scene.Root(), "Subject"))
         for (const Track& t : TracksOf(scene, *s)) ++markers, seen += SeenFrames(t, static_cast<std::size_t>(scene.frames));
-      return {"trajectories=" + std::to_string(markers) + ",seen=" + std::to_string(seen), nullptr};
+      return {"trajectories=" + std::to_string(markers) + ",seen=" + std::to_string(seen),
+              Count(markers, "trajectory", "trajectories") + " counted, seen at " + Count(seen, "frame") +
+                  " in all; the take has no camera data, so nothing was reconstructed",
+              nullptr};
     }
     case Stage::LabelROM: return LabelROM(scene, *subject, progress);
     case Stage::CalibrateLabelingSubjects: return CalibrateLabelingSubjects(scene, *subject, progress);
@@ -769,7 +792,8 @@ Outcome Compute(Context& context, Stage stage, Object* subject) {
 
 // Runs one stage over its subjects: every subject's outcome is worked out while other clients may
 // read, then all are written and recorded at once, so that a refusal for one subject changes nothing.
-void RunStage(Context& context, Stage stage, const std::vector<Object*>& subjects) {
+// Returns what it did: the take-wide stage's summary, or one "SUBJECT: summary" per subject.
+std::vector<std::string> RunStage(Context& context, Stage stage, const std::vector<Object*>& subjects) {
   CheckNeeds(context.scene, stage, subjects);
   std::vector<Object*> scope(subjects.begin(), subjects.end());
   if (!PlanOf(stage).perSubject) scope = {nullptr};
@@ -787,6 +811,15 @@ void RunStage(Context& context, Stage stage, const std::vector<Object*>& subject
       LogLine("info", name + ": " + result);
     }
   });
+  std::vector<std::string> done;
+  for (std::size_t i = 0; i < scope.size(); ++i) done.push_back(scope[i] ? scope[i]->name + ": " + outcomes[i].summary : outcomes[i].summary);
+  return done;
+}
+
+std::string Joined(const std::vector<std::string>& parts) {
+  std::string text;
+  for (const std::string& part : parts) text.append(text.empty() ? "" : "; ").append(part);
+  return text;
 }
 
 // The handlers of the stages: the inputs are read in the catalogue's order (an Options string is
@@ -795,24 +828,27 @@ template <Stage S, bool Subject, bool Options>
 void Run(Context& context, Reader& in, Writer&) {
   std::string_view name = Subject ? in.Text() : std::string_view();
   if constexpr (Options) NoOptions(PlanOf(S).name, in.Text());
-  RunStage(context, S, PlanOf(S).perSubject ? SubjectsOf(context.scene, name) : std::vector<Object*>());
+  context.summary = Joined(RunStage(context, S, PlanOf(S).perSubject ? SubjectsOf(context.scene, name) : std::vector<Object*>()));
 }
 
 // The quick post-processing run: labelling, occlusion fixing and solving, in that order, stopping at
-// the first stage that cannot run (the stages before it keep their results).
+// the first stage that cannot run (the stages before it keep their results). Its summary is each
+// stage's, as "STAGE SUBJECT: summary".
 constexpr Stage kQuickPost[] = {Stage::AutoLabel, Stage::FixOcclusion, Stage::Solve};
 
 void OfflineQuickPost(Context& context, Reader& in, Writer&) {
   std::string_view name = in.Text();
   NoOptions("OfflineQuickPost", in.Text());
   std::vector<Object*> subjects = SubjectsOf(context.scene, name);
+  std::vector<std::string> done;
   for (Stage stage : kQuickPost) {
     try {
-      RunStage(context, stage, subjects);
+      for (const std::string& part : RunStage(context, stage, subjects)) done.push_back(std::string(PlanOf(stage).name) + " " + part);
     } catch (const Failure& failure) {
       Refuse("quick post stopped at '" + std::string(PlanOf(stage).name) + "': " + failure.message);
     }
   }
+  context.summary = Joined(done);
 }
 
 constexpr HandlerEntry kHandlers[] = {

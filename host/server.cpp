@@ -229,8 +229,16 @@ void ServeClient(Shared& shared, Client& client) {
         if (access == Access::Write) alone.lock();
         else reading.lock();
         context.reading = access == Access::Stage ? &reading : nullptr;
+        context.summary.clear();
         ExitOnFault(shared, id);
         Run(id, context, in, reply);
+        if (!context.summary.empty()) {
+          // The summary goes where the reply's message is, before the outputs.
+          std::string outputs(reply.Finish().substr(protocol::kHeaderSize + outputsAt));
+          header(Ok, context.summary);
+          outputsAt = reply.size() - protocol::kHeaderSize;
+          reply.Append(outputs.data(), outputs.size());
+        }
         ok = true;
       } catch (const Failure& failure) {
         header(failure.status, failure.message);

@@ -236,7 +236,8 @@ void ReadFields(Reader& r, R& record) {
   if (!r.done()) throw DecodeError("the reply has more values than the command gives");
 }
 
-// Sets the result code and its text: the application's message when it sent one.
+// Sets the result code and its text: the application's message when it sent one (why it refused a
+// command, or what a stage or filter did), else the code's own.
 inline void SetResult(Output_Result& record, ResultCode::Enum code, std::string const& message) {
   record.Result = code;
   Own(record.ResultString, message.empty() ? ResultText(code) : message.c_str());
@@ -262,9 +263,11 @@ R Exchange(ClientConnection* connection, Read read, A const&... args) {
       } catch (const DecodeError&) {
         record = R{};
         code = ResultCode::ReplyParsingError;
+        message.clear();
       } catch (const NotNumeric&) {
         record = R{};
         code = ResultCode::ConversionError;
+        message.clear();
       }
     }
   }

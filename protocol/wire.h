@@ -7,6 +7,8 @@
 //   'H' hello (host):    u16 protocol version, u16 command count
 //   'Q' request:         u32 request id, u16 command, the command's inputs
 //   'R' reply:           u32 request id, i32 result code, text message, the command's outputs
+//                        (the message: why a command was refused; on success, what a processing
+//                        stage or a filter did, in one line, and empty for every other command)
 //   'E' refusal (host):  text message; the host closes the connection after it
 //
 // Each input and output is a tagged value (see Type): numbers in little-endian binary, texts and

@@ -119,6 +119,27 @@ def test_selected_only_uses_and_changes_the_selected_frames_alone(app):
     assert (after[0, ~selected] == before[0, ~selected]).all()
 
 
+@pytest.mark.parametrize("operation, constants, how", [
+    ("FilterApplyFIR", (31, 6, 0, 2), "low-pass of 31 taps, cut-off 6 Hz, transition 2 Hz, sample rate 100 Hz"),
+    ("FilterApplyFIR", (5, 0.1, 1, 0.3), "low-pass of 5 taps, cut-off 0.1 Hz, transition 0.3 Hz, sample rate 1 Hz"),
+    ("FilterApplyWeightedAverage", (5, 1), "triangular average over 5 frames"),
+    ("FilterApplyWeightedAverage", (1, 0), "uniform average over 1 frame"),
+])
+def test_a_filter_says_how_many_samples_it_changed(app, operation, constants, how):
+    obj, channels = marker(app)
+    values, seen = trajectory(app)
+    seen[100] = seen[103] = False  # frames 101 and 102 (indices) become a stretch of two
+    app.SetTrajectory(*MARKER, *[list(v) for v in values], [bool(v) for v in seen])
+    code, text = app.refusal(operation, obj, channels["X"], "XYZ", False, *constants)
+    after, _ = trajectory(app)
+    half = constants[0] // 2
+    short = 3 * sum(end - first for first, end in runs(seen) if end - first <= half)
+    expected = f"{(after != values).sum()} of {3 * seen.sum() - short} samples changed in 3 channels ({how})"
+    if short:
+        expected += f"; {short} samples in stretches of {half} keyed frames or fewer left as they were"
+    assert (code, text) == (0, expected)
+
+
 REFUSED = [
     ("FilterApplyFIR", ("", False, 0, 5, 100, 0), "the number of taps must be an odd number from 1 to the take's 300 frames, not 0"),
     ("FilterApplyFIR", ("", False, 4, 5, 100, 0), "not 4"),

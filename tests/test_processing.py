@@ -1,6 +1,7 @@
 """Offline processing against real hosts: fix-occlusion on the demo take, checked against the smooth
 motion that gaps were cut from, and its settings and refusals."""
 import os
+import re
 import subprocess
 import sys
 import time
@@ -161,6 +162,118 @@ def test_the_stages_record_their_documented_results_in_order(app):
         assert recorded[key].startswith(expected[key[len("Pipeline "):]])
     assert seen_frames(app, "Alice").all(axis=0).sum() == 920
 
+
+
+# ---- What each stage says it did: the success record's text, its numbers counted from the scene ----
+
+def runs_of(mask):
+    """(first, end) of every run of True in a boolean array."""
+    edges = np.flatnonzero(np.diff(np.concatenate([[0], mask.astype(int), [0]])))
+    return list(zip(edges[::2], edges[1::2]))
+
+
+def bones_of_markers(app, subject):
+    """Each marker's bone, from the subject's constraints."""
+    return {app.GetConstraintDetails(subject, "", c)[1]: app.GetConstraintDetails(subject, "", c)[2]
+            for c in app.GetConstraintNames(subject, "")}
+
+
+def count(n, noun):
+    return f"{n} {noun}" + ("" if n == 1 else "s")
+
+
+def fix_summary(app, subject, longest=50):
+    """What occlusion fixing will say for `subject`, from the gaps of its markers now: a gap is filled
+    rigidly when a marker of the same bone is seen across it and beside it."""
+    seen = {marker: trajectory(app, subject, marker)[1] for marker in app.GetMarkerNames(subject)}
+    bone = bones_of_markers(app, subject)
+    filled = rigid = longer = ends = 0
+    for marker, mask in seen.items():
+        for first, end in runs_of(~mask):
+            if first == 0 or end == len(mask):
+                ends += 1
+            elif end - first > longest:
+                longer += 1
+            else:
+                filled += 1
+                rigid += any(bone[other] == bone[marker] and seen[other][first - 1:end + 1].all()
+                             for other in seen if other != marker)
+    return (f"{subject}: {count(filled, 'gap')} filled ({rigid} from a marker of the same segment, {filled - rigid} by cubic "
+            f"interpolation), {longer + ends} left ({longer} longer than {count(longest, 'frame')}, {ends} at an end of the take)")
+
+
+def test_occlusion_fixing_says_for_each_subject_what_it_filled_and_left(app):
+    cut(app, "Bob", "RKNE", 0, 3)  # a gap at the take's start stays
+    expected = "; ".join(fix_summary(app, subject) for subject in ("Alice", "Bob"))
+    assert app.refusal("OfflineFixOcclusion", "", "") == (m.Success, expected)
+    assert app.refusal("PSL", "OfflineFixOcclusion Subject=Alice") == (m.Success, fix_summary(app, "Alice"))  # by name too
+    set_occlusion(app, "ApplyFixedMarkers", False)
+    cut(app, "Alice", "C7", 100, 10)
+    assert app.refusal("OfflineFixOcclusion", "Alice", "") == (
+        m.Success, fix_summary(app, "Alice") + "; the filled frames stay unseen (ApplyFixedMarkers is off)")
+
+
+def placed_frames(app, subject):
+    """Frames where the solver places every bone: each bone tied to markers has one of them seen (the
+    bones without markers follow a parent that has them)."""
+    bone = bones_of_markers(app, subject)
+    seen = {marker: trajectory(app, subject, marker)[1] for marker in bone}
+    return int(np.all([np.any([seen[marker] for marker in bone if bone[marker] == b], axis=0)
+                       for b in set(bone.values())], axis=0).sum())
+
+
+def translations(app, subject):
+    bones = [i for i, kind in zip(*app.ObjectGetDescendants(app.SceneGetObject(f"/{subject}")[0])) if kind == "Bone"]
+    return [app.ObjectGetAttributeValue(bone, "Translation")[2] for bone in bones]
+
+
+def test_each_stage_says_what_it_did(app):
+    cameras = len(app.SceneGetObjectList("Camera")[0])
+    everyone = sum(int(seen_frames(app, s).sum()) for s in ("Alice", "Bob"))
+    active = m.Output_LabelingSubjectCalibrationSettings_ActiveFrames_get(
+        app.record("OfflineGetLabelingSubjectCalibrationSettings"))
+    height = app.GetSubjectParamDetails("Alice", "", "Height")[0]
+    bones = len(app.GetBoneNames("Alice", ""))
+    # Each stage's text, worked out from the scene as it is just before the stage runs.
+    expected = {
+        "OfflineCalibrateCameras": lambda: f"{cameras} cameras counted; the take has no camera data, so nothing was calibrated",
+        "OfflineReconstruct": lambda: (f"24 trajectories counted, seen at {everyone} frames in all; the take has no camera data, "
+                                       "so nothing was reconstructed"),
+        "OfflineLabelROM": lambda: f"Alice: label template of 12 markers made from {seen_frames(app, 'Alice').all(axis=0).sum()} frames",
+        "OfflineCalibrateLabelingSubjects": lambda: (
+            f"Alice: offsets of 12 constraints set from {min(active, seen_frames(app, 'Alice').all(axis=0).sum())} frames"),
+        "OfflineAutoLabel": lambda: (f"Alice: {seen_frames(app, 'Alice').sum()} labels given, 0 of them to a point another "
+                                     "marker held; 0 points dropped"),
+        "OfflineFixOcclusion": lambda: fix_summary(app, "Alice"),
+        "OfflineCreateSolvingSetupFromLS": lambda: f"Alice: {bones} bones and 12 constraints checked",
+        "OfflineCalibrateSolvingSubjects": None,  # counted after: the translations it changed
+        "OfflineSolve": lambda: (f"Alice: {bones} bones solved into TX, TY and TZ, every one of them placed at "
+                                 f"{placed_frames(app, 'Alice')} of 1000 frames"),
+        "OfflineRetarget": lambda: (f"Alice: {bones} bones retargeted into RX, RY and RZ, their offsets from the root scaled by "
+                                    f"{1750 / height!r} to the 1750 mm figure"),
+    }
+    for operation, args in CHAIN:
+        before = expected[operation]() if expected[operation] else translations(app, "Alice")
+        code, text = app.refusal(operation, *args)
+        if not expected[operation]:
+            changed = sum(a != b for a, b in zip(before, translations(app, "Alice")))
+            before = f"Alice: translations of {changed} of {bones} bones set"
+        assert (code, text) == (m.Success, before), operation
+
+
+def test_quick_post_says_what_each_of_its_stages_did(app):
+    run_chain(app, 8)
+    code, text = app.refusal("OfflineQuickPost", "Alice", "")
+    assert code == m.Success
+    assert re.fullmatch(r"OfflineAutoLabel Alice: \d+ labels given, .*; 0 points dropped; "
+                        r"OfflineFixOcclusion Alice: \d+ gaps? filled \(.*\), \d+ left \(.*\); "
+                        r"OfflineSolve Alice: 13 bones solved into TX, TY and TZ, every one of them placed at 920 of 1000 frames",
+                        text), text
+
+
+def test_other_commands_answer_success_with_the_codes_text(app):
+    assert app.refusal("GetSubjectNames") == (m.Success, "OK")
+    assert app.refusal("OfflineSetOcclusionFixingSettings", app.record("OfflineGetOcclusionFixingSettings")) == (m.Success, "OK")
 
 NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the refusal)
     (0, "OfflineReconstruct", ("",), "'OfflineReconstruct' needs 'OfflineCalibrateCameras' to run first"),
