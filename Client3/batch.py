@@ -46,6 +46,11 @@ Job = Callable[[Any, str], Any]
 IMPORTED = (".csv", ".c3d")  # opened with ImportFile; anything else is a scene file for LoadFile
 
 
+class ClusterError(RuntimeError):
+    """A Dask cluster that cannot run the batch's job: raised before the first take, naming what the
+    scheduler or the workers lack."""
+
+
 class Result(NamedTuple):
     """What became of one take."""
 
@@ -257,6 +262,7 @@ def run(job: Job, takes: Iterable[str], *, workers: Optional[int] = None, cluste
     each result to a file as a JSON line; `resume` skips the takes already there (without it the
     file is started anew). A take is given once however often it is listed. `host_options` are
     passed to every application the workers start (client3-host's options, for example a --fault).
+    A Dask cluster that cannot load the job raises ClusterError before the first take.
     """
     if retries < 0:
         raise ValueError("retries must be 0 or more")
@@ -349,6 +355,8 @@ def main(argv: Optional[List[str]] = None) -> int:
     skipped = len(_done(arguments.out) & set(takes)) if arguments.resume else 0
     counts = {"done": 0, "failed": 0, "retried": 0}
     bar = _progress(len(takes) - skipped)
+    # Run as `python -m Client3.batch` this module is __main__, and the engines raise Client3.batch's.
+    cluster_error = importlib.import_module("Client3.batch").ClusterError
     began = time.perf_counter()
     interrupted = False
     try:
@@ -362,6 +370,9 @@ def main(argv: Optional[List[str]] = None) -> int:
                 bar.update()
     except KeyboardInterrupt:
         interrupted = True
+    except cluster_error as error:  # before the first take: no summary
+        print(f"{parser.prog}: {error}", file=sys.stderr)
+        return 1
     finally:
         if bar:
             bar.close()

@@ -1,19 +1,26 @@
 """Batch processing: 20 takes, each with gaps filled and its trajectories filtered, two at a time.
 
-    python examples/batch.py            # makes the takes in a temporary folder
-    python examples/batch.py FOLDER     # makes them in FOLDER and leaves them there
+    python examples/batch.py                          # makes the takes in a temporary folder
+    python examples/batch.py FOLDER                   # makes them in FOLDER and leaves them there
+    python examples/batch.py --cluster tcp://HOST:8786 FOLDER    # on a Dask cluster
 
 The takes are the demo scene with a gap of its own cut into one marker each, saved as scene files.
 Each of the two worker processes starts an application of its own and runs `process` on the takes
 it is given; the table lists the gaps of every take before, filled, and left.
+
+With `--cluster`, the takes run on the workers of a Dask scheduler started apart (`dask scheduler`,
+`dask worker`), which need Client3 but not this script: the job defined here is sent to them. Workers
+on other machines open the takes by the paths this script gives, so FOLDER must be a shared folder
+that every machine sees at the same path.
 """
 from __future__ import annotations
 
+import argparse
 import os
 import sys
 import tempfile
 import time
-from typing import Dict, List, Tuple
+from typing import Dict, List, Optional, Tuple
 
 import Client3
 import Client3.batch
@@ -65,11 +72,11 @@ def process(client: Client3.ZarvoPelluxPostClient, take: str) -> Tuple[int, int]
     return before, gaps(client)
 
 
-def main(folder: str) -> None:
+def main(folder: str, cluster: Optional[str]) -> None:
     takes = make_takes(folder)
     began = time.perf_counter()
     rows: Dict[str, Tuple[int, int]] = {}
-    for result in Client3.batch.run(process, takes, workers=WORKERS):
+    for result in Client3.batch.run(process, takes, workers=WORKERS, cluster=cluster):
         if not result.ok:
             sys.exit(f"{result.take}: {result.value}")
         rows[os.path.basename(result.take)] = result.value
@@ -77,13 +84,17 @@ def main(folder: str) -> None:
     print(f"{'take':<14}{'gaps':>6}{'filled':>8}{'left':>6}")
     for name, (before, after) in sorted(rows.items()):
         print(f"{name:<14}{before:>6}{before - after:>8}{after:>6}")
-    print(f"{len(rows)} takes in {seconds:.1f} s with {WORKERS} workers")
+    print(f"{len(rows)} takes in {seconds:.1f} s " + (f"on {cluster}" if cluster else f"with {WORKERS} workers"))
 
 
 if __name__ == "__main__":  # the workers import this file too: only the main process runs the batch
-    if len(sys.argv) > 1:
-        os.makedirs(sys.argv[1], exist_ok=True)
-        main(sys.argv[1])
+    parser = argparse.ArgumentParser(description="Fills and filters 20 takes in a batch.")
+    parser.add_argument("folder", nargs="?", help="where the takes are made (default: a temporary folder)")
+    parser.add_argument("--cluster", metavar="ADDRESS", help="a Dask scheduler's address")
+    arguments = parser.parse_args()
+    if arguments.folder:
+        os.makedirs(arguments.folder, exist_ok=True)
+        main(arguments.folder, arguments.cluster)
     else:
         with tempfile.TemporaryDirectory() as temporary:
-            main(temporary)
+            main(temporary, arguments.cluster)
