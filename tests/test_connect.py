@@ -85,7 +85,7 @@ def place(start_host):
 CAUSES = [
     (closed_port, "", None, m.NotConnected, "refused the connection"),
     (closed_ipv6_port, "", None, m.NotConnected, "refused the connection"),
-    (closed_port, "", 70000, m.NotConnected, "was not tried: a port is a number from 1 to 65535 (0 or less for 8870)"),
+    (closed_port, "", 65536, m.NotConnected, "was not tried: a port is a number from 1 to 65535 (0 or less for 8870)"),
     (closed_port, "?timeout=2000&colour=red", None, m.NotConnected,
      "was not tried: 'colour' is not an address option (they are timeout=MS, connect=MS and token=TEXT)"),
     (closed_port, "?tokn=SECRET", None, m.NotConnected,  # a mistyped option's value is not repeated
