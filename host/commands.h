@@ -61,7 +61,7 @@ struct Context {
   std::shared_lock<SceneLock>* reading = nullptr;
   // What the command did, in one line, for the message of its reply when it succeeds: set by the
   // processing stages and the filters, empty for every other command.
-  std::string summary;
+  std::string summary = {};
 };
 
 // Runs `write` with the scene held alone, then shares it again.
