@@ -1,4 +1,5 @@
-"""Jobs for the batch tests: importable by name, as the workers need them."""
+"""Jobs for the batch tests, importable by name as the pool's workers need them, and the takes they
+run on."""
 import os
 import time
 
@@ -48,3 +49,27 @@ def slow(client, take):
     """Takes a while: long enough to be interrupted."""
     time.sleep(1)
     return fix(client, take)
+
+
+def make_takes(folder, count, frames, last_as_csv=False):
+    """`count` demo takes of `frames` frames saved in `folder`, the i-th with a gap of 5 + 3i frames cut
+    into Alice's LANK (the last one exported as CSV when asked); their paths."""
+    import Client3
+    from Client3.testing import running_host
+
+    base = os.path.join(folder, "base.scene")
+    paths = []
+    with running_host(frames=frames, log=False) as host, Client3.connect(host.address, host.port) as client:
+        client.SaveFile(base, "").check()
+        for index in range(count):
+            client.LoadFile(base).check()
+            trajectory = client.GetTrajectory("Alice", "LANK").check()
+            seen = list(trajectory.E)
+            seen[20:25 + 3 * index] = [False] * (5 + 3 * index)
+            client.SetTrajectory("Alice", "LANK", trajectory.X, trajectory.Y, trajectory.Z, seen).check()
+            paths.append(os.path.join(folder, f"take{index}.scene"))
+            client.SaveFile(paths[-1], "").check()
+        if last_as_csv:
+            paths[-1] = paths[-1].replace(".scene", ".csv")
+            client.ExportFile(paths[-1], "").check()
+    return paths

@@ -46,22 +46,7 @@ def open_take(client, path):
 @pytest.fixture(scope="module")
 def takes(tmp_path_factory):
     """Demo takes, each with a gap of its own cut into Alice's LANK; the last one as CSV."""
-    folder = tmp_path_factory.mktemp("takes")
-    base = str(folder / "base.scene")
-    paths = []
-    with running_host(frames=FRAMES, log=False) as host, Client3.connect(host.address, host.port) as client:
-        client.SaveFile(base, "").check()
-        for index in range(TAKES):
-            client.LoadFile(base).check()
-            trajectory = client.GetTrajectory("Alice", "LANK").check()
-            seen = list(trajectory.E)
-            seen[20:25 + 3 * index] = [False] * (5 + 3 * index)
-            client.SetTrajectory("Alice", "LANK", trajectory.X, trajectory.Y, trajectory.Z, seen).check()
-            paths.append(str(folder / f"take{index}.scene"))
-            client.SaveFile(paths[-1], "").check()
-        paths[-1] = paths[-1].replace(".scene", ".csv")
-        client.ExportFile(paths[-1], "").check()
-    return paths
+    return batchjobs.make_takes(str(tmp_path_factory.mktemp("takes")), TAKES, FRAMES, last_as_csv=True)
 
 
 @pytest.fixture(scope="module")

@@ -6,6 +6,7 @@ import contextlib
 import json
 import os
 import re
+import shutil
 import subprocess
 import sys
 import threading
@@ -17,6 +18,7 @@ import pytest
 
 import Client3
 import Client3.batch
+import batchjobs
 import companion
 from Client3.testing import running_host
 
@@ -25,22 +27,6 @@ distributed = pytest.importorskip("distributed")
 WAIT = 60  # seconds a process may take to start or stop
 TAKES = 4
 MARKER = "CLIENT3_DEPLOYED_TEST"  # in the environment of every process the tests start
-
-STEPS = '''
-def unseen(client):
-    total = 0
-    for subject in ("Alice", "Bob"):
-        for marker in client.GetMarkerNames(subject).check().Names:
-            total += list(client.GetTrajectory(subject, str(marker)).check().E).count(False)
-    return total
-
-
-def fix(client, take):
-    """The frames unseen before and after filling the gaps."""
-    before = unseen(client)
-    client.OfflineFixOcclusion("", "").check()
-    return [before, unseen(client)]
-'''
 
 # The batch as a user's script runs it: `python script.py ADDRESS TAKE...`, one JSON line per take.
 SCRIPT = '''
@@ -150,35 +136,23 @@ class Deployed:
 
 @pytest.fixture(scope="module")
 def user(tmp_path_factory):
-    """The user's folder: the script, the job's module beside it, and demo takes with gaps of their
-    own. Nothing else has it on a path."""
+    """The user's folder: the script, the job's module beside it (the batch tests' jobs, as `steps`),
+    and demo takes. Nothing else has it on a path."""
     folder = tmp_path_factory.mktemp("user")
-    (folder / "steps.py").write_text(STEPS)
+    shutil.copy(batchjobs.__file__, folder / "steps.py")
     (folder / "script.py").write_text(SCRIPT)
-    base = str(folder / "base.scene")
-    with running_host(frames=200, log=False) as host, Client3.connect(host.address, host.port) as client:
-        client.SaveFile(base, "").check()
-        for index in range(TAKES):
-            client.LoadFile(base).check()
-            trajectory = client.GetTrajectory("Alice", "LANK").check()
-            seen = list(trajectory.E)
-            seen[20:25 + 3 * index] = [False] * (5 + 3 * index)
-            client.SetTrajectory("Alice", "LANK", trajectory.X, trajectory.Y, trajectory.Z, seen).check()
-            client.SaveFile(str(folder / f"take{index}.scene"), "").check()
+    batchjobs.make_takes(str(folder), TAKES, 200)
     return folder
 
 
 @pytest.fixture(scope="module")
 def serial(user):
     """The job's value for each take, run here one take after the other."""
-    namespace = {}
-    exec(STEPS, namespace)
     values = {}
     with running_host(scene="empty", log=False) as host, Client3.connect(host.address, host.port) as client:
-        for index in range(TAKES):
-            take = str(user / f"take{index}.scene")
+        for take in takes_of(user):
             client.LoadFile(take).check()
-            values[take] = namespace["fix"](client, take)
+            values[take] = batchjobs.fix(client, take)
     return values
 
 
