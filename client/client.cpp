@@ -9,7 +9,7 @@
 #include "containers/sequence.h"
 #include "protocol/catalogue.h"
 #include "records/record.h"
-#include "runtime/module.h"
+#include "client/client.h"
 #include "runtime/wrap.h"
 
 namespace client3 {

@@ -54,7 +54,7 @@ struct RecordRule {
 // Each record's rules as the library's record descriptions give them.
 #define CLIENT3_FIELD_RULE(type, name, fallback, ...) , FieldRule{#name, #fallback __VA_OPT__(, ) __VA_ARGS__}
 #define CLIENT3_ORDER_RULE(low, high) , OrderRule{#low, #high}
-#define CLIENT3_RULES(X, record, what)                                                                          \
+#define CLIENT3_RULES(X, record, what)                                                                               \
   constexpr auto k##record##Fields = Rules<FieldRule>(0 ZARVO_FIELDS_Output_##record##Settings(CLIENT3_FIELD_RULE)); \
   constexpr auto k##record##Order = Rules<OrderRule>(0 ZARVO_ORDER_Output_##record##Settings(CLIENT3_ORDER_RULE));
 CLIENT3_SETTINGS(CLIENT3_RULES, )
@@ -62,7 +62,7 @@ CLIENT3_SETTINGS(CLIENT3_RULES, )
 #undef CLIENT3_ORDER_RULE
 #undef CLIENT3_FIELD_RULE
 
-#define CLIENT3_RECORD_RULE(X, record, what) \
+#define CLIENT3_RECORD_RULE(X, record, what)                                                                          \
   {#record, Id::OfflineGet##record##Settings, Id::OfflineSet##record##Settings, k##record##Fields, k##record##Order},
 const RecordRule kRecords[kRecordCount] = {CLIENT3_SETTINGS(CLIENT3_RECORD_RULE, )};
 #undef CLIENT3_RECORD_RULE
@@ -152,7 +152,7 @@ void Set(Context& context, Reader& in, Writer&) {
   LogLine("info", "settings " + std::string(rule.name) + " set: " + context.scene.settings.Summary(R));
 }
 
-#define CLIENT3_HANDLERS(X, record, what)                                      \
+#define CLIENT3_HANDLERS(X, record, what)                                 \
   {Id::OfflineGet##record##Settings, &Get<Record::record>, Access::Read}, \
   {Id::OfflineSet##record##Settings, &Set<Record::record>},
 constexpr HandlerEntry kHandlers[] = {CLIENT3_SETTINGS(CLIENT3_HANDLERS, )};

@@ -31,11 +31,11 @@ using client3::protocol::Writer;
 template <class R>
 inline constexpr auto FieldsOf = std::tuple<>{};
 #define CLIENT3_MEMBER(type, name, ...) &Record::name,
-#define CLIENT3_FIELDS(R)                                   \
-  template <>                                               \
-  inline constexpr auto FieldsOf<R> = [] {                  \
-    using Record = R;                                       \
-    return std::tuple{ZARVO_FIELDS_##R(CLIENT3_MEMBER)};    \
+#define CLIENT3_FIELDS(R)                                \
+  template <>                                            \
+  inline constexpr auto FieldsOf<R> = [] {               \
+    using Record = R;                                    \
+    return std::tuple{ZARVO_FIELDS_##R(CLIENT3_MEMBER)}; \
   }();
 ZARVO_RESULT_RECORDS(CLIENT3_FIELDS)
 ZARVO_SETTINGS_RECORDS(CLIENT3_FIELDS)

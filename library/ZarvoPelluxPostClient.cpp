@@ -119,9 +119,9 @@ Output_GetTrajectoryAtFrame request::Call<Id::GetTrajectoryAtFrame, Output_GetTr
 
 // Every member that is a command. The header's declaration must return the catalogue's result and
 // take parameters of the inputs' types, or this does not build.
-#define CLIENT3_DEFINE(name, result, description, in, out)                                   \
-  static_assert(std::is_same_v<Result<&C::name>, result>, #name " returns the catalogue's result"); \
-  Result<&C::name> C::name(CLIENT3_CAT(CLIENT3_PARAMS_, CLIENT3_COUNT in)(&C::name)) {          \
+#define CLIENT3_DEFINE(name, result, description, in, out)                                             \
+  static_assert(std::is_same_v<Result<&C::name>, result>, #name " returns the catalogue's result");    \
+  Result<&C::name> C::name(CLIENT3_CAT(CLIENT3_PARAMS_, CLIENT3_COUNT in)(&C::name)) {                 \
     return request::Call<Id::name, result>(m_Connection CLIENT3_CAT(CLIENT3_ARGS_, CLIENT3_COUNT in)); \
   }
 CLIENT3_CLIENT_COMMANDS(CLIENT3_DEFINE)

@@ -68,15 +68,15 @@ struct Command {
 // OfflineSet<Name>Settings, whose outputs and inputs are the fields of the library's record
 // Output_<Name>Settings as ZarvoSDKClientCPP/OutputFields.h describes it. S(X, Name, what) per record,
 // in the order of the commands.
-#define CLIENT3_SETTINGS(S, X)                                \
-  S(X, CircleFit, "circle-fitting")                           \
-  S(X, Reconstruct, "reconstruction")                         \
-  S(X, LabelROM, "range-of-motion labelling")                 \
-  S(X, Labeling, "labelling")                                 \
+#define CLIENT3_SETTINGS(S, X)                                      \
+  S(X, CircleFit, "circle-fitting")                                 \
+  S(X, Reconstruct, "reconstruction")                               \
+  S(X, LabelROM, "range-of-motion labelling")                       \
+  S(X, Labeling, "labelling")                                       \
   S(X, LabelingSubjectCalibration, "labelling-subject calibration") \
-  S(X, OcclusionFixing, "occlusion-fixing")                   \
+  S(X, OcclusionFixing, "occlusion-fixing")                         \
   S(X, Solving, "solving")
-#define CLIENT3_SETTINGS_COMMANDS(X, record, what)                                                        \
+#define CLIENT3_SETTINGS_COMMANDS(X, record, what)                                                           \
   X(OfflineGet##record##Settings, Output_##record##Settings, "The " what " settings.", (), (record##Fields)) \
   X(OfflineSet##record##Settings, Output_Result, "Sets the " what " settings.", (record##Fields), ())
 

@@ -1,7 +1,6 @@
 // Type_Parameter and the Output_* records: each record's fields (as the library's OutputFields.h
 // describes them) and then its member functions.
 #include "records/record.h"
-#include "runtime/module.h"
 
 namespace client3 {
 
@@ -15,11 +14,11 @@ using namespace record;
 template <class X>
 struct Described;
 #define CLIENT3_FIELD(type, name, ...) , Field<#name, &X::name>
-#define CLIENT3_DESCRIBED(R)                                       \
-  template <>                                                      \
-  struct Described<R> {                                            \
-    using X = R;                                                   \
-    template <template <class...> class Kind, class... Methods>    \
+#define CLIENT3_DESCRIBED(R)                                        \
+  template <>                                                       \
+  struct Described<R> {                                             \
+    using X = R;                                                    \
+    template <template <class...> class Kind, class... Methods>     \
     using As = Kind<R ZARVO_FIELDS_##R(CLIENT3_FIELD), Methods...>; \
   };
 CLIENT3_DESCRIBED(Type_Parameter)

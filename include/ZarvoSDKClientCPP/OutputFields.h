@@ -20,7 +20,7 @@
 
 // ---- Protocol records ---------------------------------------------------------------------------
 
-#define ZARVO_FIELDS_Output_ProcessRequest(FIELD) \
+#define ZARVO_FIELDS_Output_ProcessRequest(FIELD)      \
   FIELD(std::vector<Type_Parameter>, OutputParameters)
 
 #define ZARVO_FIELDS_Output_GetServerInfo(FIELD) \
@@ -145,45 +145,45 @@
 #define ZARVO_ORDER_Output_CircleFitSettings(ORDER)
 
 // Distances in millimetres; the volume reaches 100 m either way from the origin.
-#define ZARVO_FIELDS_Output_ReconstructSettings(FIELD)                           \
-  FIELD(double,       EnvironmentalDriftTolerance, 1.5,    0,       10)          \
-  FIELD(unsigned int, MinCamsToStartTrajectory,    3,      2,       16)          \
-  FIELD(unsigned int, MinCamsToContinueTrajectory, 2,      2,       16)          \
-  FIELD(double,       ReconMinSeparation,          14,     0,       1000)        \
-  FIELD(double,       MinCentroidRadius,           0,      0,       50)          \
-  FIELD(double,       MaxCentroidRadius,           50,     0,       1000)        \
-  FIELD(double,       MinReconstructionRadius,     0,      0,       100)         \
-  FIELD(double,       MaxReconstructionRadius,     1000,   0,       10000)       \
-  FIELD(SafeString,   FitMethod,                   Fast,   "Fast|Accurate")      \
-  FIELD(double,       PredicationMatchFactor,      1,      0,       10)          \
-  FIELD(unsigned int, MinTrajectoryLength,         2,      1,       1000)        \
-  FIELD(double,       StartupError,                150,    0,       1000)        \
-  FIELD(double,       PredicationError,            150,    0,       1000)        \
-  FIELD(bool,         ComputeRadius,               true)                         \
-  FIELD(double,       MinVolumeX,                  -10000, -100000, 100000)      \
-  FIELD(double,       MinVolumeY,                  -10000, -100000, 100000)      \
-  FIELD(double,       MinVolumeZ,                  -1000,  -100000, 100000)      \
-  FIELD(double,       MaxVolumeX,                  10000,  -100000, 100000)      \
-  FIELD(double,       MaxVolumeY,                  10000,  -100000, 100000)      \
-  FIELD(double,       MaxVolumeZ,                  5000,   -100000, 100000)      \
+#define ZARVO_FIELDS_Output_ReconstructSettings(FIELD)                      \
+  FIELD(double,       EnvironmentalDriftTolerance, 1.5,    0,       10)     \
+  FIELD(unsigned int, MinCamsToStartTrajectory,    3,      2,       16)     \
+  FIELD(unsigned int, MinCamsToContinueTrajectory, 2,      2,       16)     \
+  FIELD(double,       ReconMinSeparation,          14,     0,       1000)   \
+  FIELD(double,       MinCentroidRadius,           0,      0,       50)     \
+  FIELD(double,       MaxCentroidRadius,           50,     0,       1000)   \
+  FIELD(double,       MinReconstructionRadius,     0,      0,       100)    \
+  FIELD(double,       MaxReconstructionRadius,     1000,   0,       10000)  \
+  FIELD(SafeString,   FitMethod,                   Fast,   "Fast|Accurate") \
+  FIELD(double,       PredicationMatchFactor,      1,      0,       10)     \
+  FIELD(unsigned int, MinTrajectoryLength,         2,      1,       1000)   \
+  FIELD(double,       StartupError,                150,    0,       1000)   \
+  FIELD(double,       PredicationError,            150,    0,       1000)   \
+  FIELD(bool,         ComputeRadius,               true)                    \
+  FIELD(double,       MinVolumeX,                  -10000, -100000, 100000) \
+  FIELD(double,       MinVolumeY,                  -10000, -100000, 100000) \
+  FIELD(double,       MinVolumeZ,                  -1000,  -100000, 100000) \
+  FIELD(double,       MaxVolumeX,                  10000,  -100000, 100000) \
+  FIELD(double,       MaxVolumeY,                  10000,  -100000, 100000) \
+  FIELD(double,       MaxVolumeZ,                  5000,   -100000, 100000) \
   FIELD(int,          NumThreads,                  0,      0,       64)
-#define ZARVO_ORDER_Output_ReconstructSettings(ORDER)               \
-  ORDER(MinCamsToContinueTrajectory, MinCamsToStartTrajectory)      \
-  ORDER(MinCentroidRadius,           MaxCentroidRadius)             \
-  ORDER(MinReconstructionRadius,     MaxReconstructionRadius)       \
-  ORDER(MinVolumeX,                  MaxVolumeX)                    \
-  ORDER(MinVolumeY,                  MaxVolumeY)                    \
+#define ZARVO_ORDER_Output_ReconstructSettings(ORDER)          \
+  ORDER(MinCamsToContinueTrajectory, MinCamsToStartTrajectory) \
+  ORDER(MinCentroidRadius,           MaxCentroidRadius)        \
+  ORDER(MinReconstructionRadius,     MaxReconstructionRadius)  \
+  ORDER(MinVolumeX,                  MaxVolumeX)               \
+  ORDER(MinVolumeY,                  MaxVolumeY)               \
   ORDER(MinVolumeZ,                  MaxVolumeZ)
 
-#define ZARVO_FIELDS_Output_LabelingSettings(FIELD)                  \
-  FIELD(bool,   UseLabelingClusters,                true)            \
-  FIELD(double, LabelCompletenessEntranceThreshold, 0.75, 0, 1)      \
-  FIELD(bool,   UseRobustBooting,                   true)            \
-  FIELD(double, BootingQuality,                     0.5,  0, 1)      \
-  FIELD(double, BootingVersusTracking,              1,    0, 10)     \
-  FIELD(double, TrackingQuality,                    0.5,  0, 1)      \
-  FIELD(double, SmoothingFactor,                    0.5,  0, 1)      \
-  FIELD(bool,   SinglePassLabel,                    false)           \
+#define ZARVO_FIELDS_Output_LabelingSettings(FIELD)              \
+  FIELD(bool,   UseLabelingClusters,                true)        \
+  FIELD(double, LabelCompletenessEntranceThreshold, 0.75, 0, 1)  \
+  FIELD(bool,   UseRobustBooting,                   true)        \
+  FIELD(double, BootingQuality,                     0.5,  0, 1)  \
+  FIELD(double, BootingVersusTracking,              1,    0, 10) \
+  FIELD(double, TrackingQuality,                    0.5,  0, 1)  \
+  FIELD(double, SmoothingFactor,                    0.5,  0, 1)  \
+  FIELD(bool,   SinglePassLabel,                    false)       \
   FIELD(int,    NumThreads,                         0,    0, 64)
 #define ZARVO_ORDER_Output_LabelingSettings(ORDER)
 
@@ -203,17 +203,17 @@
   FIELD(double, FingerMultiplier,   1, 0, 10)
 #define ZARVO_ORDER_Output_SolvingSettings(ORDER)
 
-#define ZARVO_FIELDS_Output_LabelingSubjectCalibrationSettings(FIELD) \
-  FIELD(float,      RestImportance,          1,      0, 100)          \
-  FIELD(float,      MarkerImportance,        1,      0, 100)          \
-  FIELD(float,      SegmentImportance,       1,      0, 100)          \
+#define ZARVO_FIELDS_Output_LabelingSubjectCalibrationSettings(FIELD)   \
+  FIELD(float,      RestImportance,          1,      0, 100)            \
+  FIELD(float,      MarkerImportance,        1,      0, 100)            \
+  FIELD(float,      SegmentImportance,       1,      0, 100)            \
   FIELD(SafeString, Quality,                 Medium, "Low|Medium|High") \
-  FIELD(SafeString, StatsMode,               Full,   "Full|Basic")    \
-  FIELD(SafeString, CalibrationMode,         Static, "Static|Dynamic") \
-  FIELD(int,        ActiveFrames,            200,    1, 100000)       \
-  FIELD(bool,       AutoSaveZSK,             false)                   \
-  FIELD(bool,       AutoSavePreCalHDF,       false)                   \
-  FIELD(bool,       OverwriteRangeTemplates, false)                   \
+  FIELD(SafeString, StatsMode,               Full,   "Full|Basic")      \
+  FIELD(SafeString, CalibrationMode,         Static, "Static|Dynamic")  \
+  FIELD(int,        ActiveFrames,            200,    1, 100000)         \
+  FIELD(bool,       AutoSaveZSK,             false)                     \
+  FIELD(bool,       AutoSavePreCalHDF,       false)                     \
+  FIELD(bool,       OverwriteRangeTemplates, false)                     \
   FIELD(bool,       ShowCovariance,          false)
 #define ZARVO_ORDER_Output_LabelingSubjectCalibrationSettings(ORDER)
 
@@ -229,30 +229,30 @@
   X(Output_ProcessRequest)        \
   X(Output_GetServerInfo)         \
   X(Output_GetCommandList)
-#define ZARVO_QUERY_RECORDS(X)        \
-  X(Output_GetSceneName)              \
-  X(Output_GetSubjectNames)           \
-  X(Output_GetMarkerNames)            \
-  X(Output_HasTrajectory)             \
-  X(Output_GetTrajectory)             \
-  X(Output_GetTrajectoryAtFrame)      \
-  X(Output_GetBoneNames)              \
-  X(Output_GetRootBone)               \
-  X(Output_GetBoneDetails)            \
-  X(Output_GetConstraintNames)        \
-  X(Output_GetConstraintDetails)      \
-  X(Output_GetSubjectParamNames)      \
-  X(Output_GetSubjectParamDetails)    \
-  X(Output_GetObject)                 \
-  X(Output_GetObjectList)             \
-  X(Output_GetIntegerList)            \
-  X(Output_GetString)                 \
-  X(Output_GetAttribute)              \
-  X(Output_GetStringList)             \
-  X(Output_GetInteger)                \
-  X(Output_GetUnsignedLong)           \
-  X(Output_GetUnsignedLongList)       \
-  X(Output_GetFloat)                  \
+#define ZARVO_QUERY_RECORDS(X)     \
+  X(Output_GetSceneName)           \
+  X(Output_GetSubjectNames)        \
+  X(Output_GetMarkerNames)         \
+  X(Output_HasTrajectory)          \
+  X(Output_GetTrajectory)          \
+  X(Output_GetTrajectoryAtFrame)   \
+  X(Output_GetBoneNames)           \
+  X(Output_GetRootBone)            \
+  X(Output_GetBoneDetails)         \
+  X(Output_GetConstraintNames)     \
+  X(Output_GetConstraintDetails)   \
+  X(Output_GetSubjectParamNames)   \
+  X(Output_GetSubjectParamDetails) \
+  X(Output_GetObject)              \
+  X(Output_GetObjectList)          \
+  X(Output_GetIntegerList)         \
+  X(Output_GetString)              \
+  X(Output_GetAttribute)           \
+  X(Output_GetStringList)          \
+  X(Output_GetInteger)             \
+  X(Output_GetUnsignedLong)        \
+  X(Output_GetUnsignedLongList)    \
+  X(Output_GetFloat)               \
   X(Output_GetTakeInfo)
 // Output_GetCommandInfo, which also has a member function, is declared between the two.
 #define ZARVO_RESULT_RECORDS(X) ZARVO_PROTOCOL_RECORDS(X) X(Output_GetCommandInfo) ZARVO_QUERY_RECORDS(X)
@@ -267,11 +267,11 @@
   X(Output_GetTrialName)
 
 // The processing settings, which scripts also create.
-#define ZARVO_SETTINGS_RECORDS(X)             \
-  X(Output_CircleFitSettings)                 \
-  X(Output_ReconstructSettings)               \
-  X(Output_LabelingSettings)                  \
-  X(Output_OcclusionFixingSettings)           \
-  X(Output_SolvingSettings)                   \
+#define ZARVO_SETTINGS_RECORDS(X)              \
+  X(Output_CircleFitSettings)                  \
+  X(Output_ReconstructSettings)                \
+  X(Output_LabelingSettings)                   \
+  X(Output_OcclusionFixingSettings)            \
+  X(Output_SolvingSettings)                    \
   X(Output_LabelingSubjectCalibrationSettings) \
   X(Output_LabelROMSettings)

@@ -32,10 +32,10 @@ enum Enum : int {
 
 // A member for each row of a record's table in OutputFields.h.
 #define ZARVO_DECLARE_FIELD(type, name, ...) type name;
-#define ZARVO_DECLARE_RECORD(record)                 \
-  class record : public Output_Result {              \
-  public:                                            \
-    ZARVO_FIELDS_##record(ZARVO_DECLARE_FIELD)       \
+#define ZARVO_DECLARE_RECORD(record)           \
+  class record : public Output_Result {        \
+  public:                                      \
+    ZARVO_FIELDS_##record(ZARVO_DECLARE_FIELD) \
   };
 #define ZARVO_DECLARE_LEGACY_RECORD(record) \
   class record : public Output_Result {};
