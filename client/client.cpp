@@ -6,10 +6,10 @@
 #include <type_traits>
 #include <vector>
 
+#include "client/client.h"
 #include "containers/sequence.h"
 #include "protocol/catalogue.h"
 #include "records/record.h"
-#include "client/client.h"
 #include "runtime/wrap.h"
 
 namespace client3 {
