@@ -47,7 +47,7 @@ def python_type(cpp: str, argument: bool) -> str:
 def catalogue_inputs() -> Dict[str, List[str]]:
     inputs: Dict[str, List[str]] = {}
     for line in CATALOGUE.read_text().splitlines():
-        command = re.match(r'\s*X\((\w+), "(?:[^"\\]|\\.)*", \(', line)
+        command = re.match(r'\s*X\((\w+), [\w ]+, "(?:[^"\\]|\\.)*", \(', line)
         if command:
             depth, start = 1, command.end()
             end = start
@@ -68,9 +68,15 @@ def client_operations() -> Dict[str, Tuple[str, List[str]]]:
 
 
 def records() -> Dict[str, Dict[str, str]]:
-    """The fields and member functions of every record, with their declared types."""
-    text = (HEADERS / "Outputs.h").read_text()
+    """The fields and member functions of every record, with their declared types: the fields from
+    the records' tables in OutputFields.h, the member functions from Outputs.h."""
     found: Dict[str, Dict[str, str]] = {}
+    fields = (HEADERS / "OutputFields.h").read_text()
+    for match in re.finditer(r"^#define ZARVO_FIELDS_(\w+)\(FIELD\)((?:.*\\\n)*.*)$", fields, re.M):
+        members = found.setdefault(match.group(1), {})
+        for field in re.finditer(r"FIELD\(([\w:<> ]+?),\s*(\w+)", match.group(2)):
+            members[field.group(2)] = field.group(1)
+    text = (HEADERS / "Outputs.h").read_text()
     for match in re.finditer(r"^class (\w+)[^{]*\{(.*?)^\};", text, re.M | re.S):
         members = found.setdefault(match.group(1), {})
         for member in re.finditer(r"^\s+([\w:<>]+(?: [\w:<>]+)*) (\w+)(\(\))?(?: const)?\s*[;{]", match.group(2), re.M):

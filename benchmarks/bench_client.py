@@ -63,7 +63,8 @@ def build_floor(folder):
     source = os.path.join(HERE, "bench_client_floor.cpp")
     # Without the sanitizer runtime that a sanitized test run preloads: the compiler is not ours to check.
     environment = {k: v for k, v in os.environ.items() if k != "LD_PRELOAD"}
-    subprocess.run(["g++", "-O2", "-std=c++20", "-pthread", "-I", ROOT, source, "-o", program],
+    subprocess.run(["g++", "-O2", "-std=c++20", "-pthread", "-I", ROOT, "-I", os.path.join(ROOT, "include"), source,
+                    "-o", program],
                    check=True, timeout=300, env=environment)
     return program
 

@@ -16,7 +16,7 @@
 #include <vector>
 
 #include "runtime/runtime.h"
-#include "runtime/types.h"
+#include "types/types.h"
 
 namespace client3 {
 namespace {

@@ -5,7 +5,6 @@
 
 #include "containers/dispatch.h"
 #include "containers/iterators.h"
-#include "runtime/module.h"
 #include "runtime/wrap.h"
 
 namespace client3 {

@@ -5,6 +5,7 @@
 
 #include <cstddef>
 #include <iterator>
+#include <span>
 #include <stdexcept>
 #include <type_traits>
 #include <vector>
@@ -13,6 +14,14 @@
 #include "convert/text.h"
 #include "runtime/runtime.h"
 #include "runtime/wrap.h"
+#include "types/types.h"
+
+namespace client3 {
+
+// The iterator class's module functions (iterators.cpp).
+std::span<const PyMethodDef> IteratorFunctions();
+
+}  // namespace client3
 
 namespace swig {
 

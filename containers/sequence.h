@@ -6,6 +6,7 @@
 #include <cstdio>
 #include <cstring>
 #include <memory>
+#include <span>
 #include <stdexcept>
 #include <type_traits>
 #include <vector>
@@ -14,10 +15,13 @@
 #include "convert/text.h"
 #include "runtime/runtime.h"
 #include "runtime/text.h"
-#include "runtime/types.h"
+#include "types/types.h"
 #include "ZarvoSDKClientCPP/SafeString.h"
 
 namespace client3 {
+
+// The six vector classes' module functions (vectors.cpp).
+std::span<const PyMethodDef> VectorFunctions();
 
 using ZarvoSDKClientCPP::SafeString;
 

@@ -11,7 +11,6 @@
 #include "containers/iterators.h"
 #include "containers/sequence.h"
 #include "containers/slices.h"
-#include "runtime/module.h"
 #include "runtime/wrap.h"
 
 namespace client3 {

@@ -7,8 +7,8 @@
 #include "convert/scalar.h"
 #include "convert/text.h"
 #include "library/ResultText.h"
-#include "runtime/module.h"
 #include "runtime/wrap.h"
+#include "types/types.h"
 
 namespace client3 {
 

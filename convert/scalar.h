@@ -80,17 +80,6 @@ inline int AsFloat(PyObject* o, float* out) {
   return ResultOk;
 }
 
-// ---- Results ----------------------------------------------------------------------------------
-
-inline PyObject* ToPython(int v) { return PyLong_FromLong(v); }
-inline PyObject* ToPython(unsigned int v) { return PyLong_FromSize_t(v); }
-inline PyObject* ToPython(bool v) { return PyBool_FromLong(v); }
-inline PyObject* ToPython(float v) { return PyFloat_FromDouble(v); }
-inline PyObject* ToPython(double v) { return PyFloat_FromDouble(v); }
-inline PyObject* ToPython(unsigned long long v) {
-  return v < 0x80000000ULL ? PyLong_FromLong(static_cast<long>(v)) : PyLong_FromUnsignedLongLong(v);
-}
-
 // ---- Kinds ------------------------------------------------------------------------------------
 
 template <class T, Text Type, int (*Convert)(PyObject*, T*)>

@@ -4,14 +4,17 @@
 #pragma once
 
 #include <cstring>
+#include <span>
 #include <string>
 
 #include "runtime/runtime.h"
 #include "runtime/text.h"
-#include "runtime/types.h"
 #include "ZarvoSDKClientCPP/SafeString.h"
 
 namespace client3 {
+
+// The SafeString class's module functions and ToString (safestring.cpp).
+std::span<const PyMethodDef> SafeStringFunctions();
 
 // The character-pointer descriptor, looked up once.
 inline TypeInfo* CharDescriptor() {

@@ -1,4 +1,5 @@
-// The settings records: their defaults and ranges, and the commands that read and replace them.
+// The settings records: their defaults and ranges (from the library's record descriptions), and the
+// commands that read and replace them.
 #include "host/settings.h"
 
 #include <cmath>
@@ -25,12 +26,23 @@ struct FieldRule {
   std::string_view name, fallback;
   double least = 0, most = 0;
   std::string_view words = {};
+
+  constexpr FieldRule(std::string_view name, std::string_view fallback) : name(name), fallback(fallback) {}
+  constexpr FieldRule(std::string_view name, std::string_view fallback, double least, double most)
+      : name(name), fallback(fallback), least(least), most(most) {}
+  constexpr FieldRule(std::string_view name, std::string_view fallback, std::string_view words)
+      : name(name), fallback(fallback), words(words) {}
 };
 
 // Two fields of one record where the first may not exceed the second.
 struct OrderRule {
   std::string_view low, high;
 };
+
+template <class T, class... R>
+constexpr std::array<T, sizeof...(R)> Rules(int, R... rules) {
+  return {rules...};
+}
 
 struct RecordRule {
   std::string_view name;
@@ -39,114 +51,26 @@ struct RecordRule {
   std::span<const OrderRule> order;
 };
 
-constexpr double kVolume = 100'000;  // millimetres either way from the origin
+// Each record's rules as the library's record descriptions give them.
+#define CLIENT3_FIELD_RULE(type, name, fallback, ...) , FieldRule{#name, #fallback __VA_OPT__(, ) __VA_ARGS__}
+#define CLIENT3_ORDER_RULE(low, high) , OrderRule{#low, #high}
+#define CLIENT3_RULES(X, record, what)                                                                               \
+  constexpr auto k##record##Fields = Rules<FieldRule>(0 ZARVO_FIELDS_Output_##record##Settings(CLIENT3_FIELD_RULE)); \
+  constexpr auto k##record##Order = Rules<OrderRule>(0 ZARVO_ORDER_Output_##record##Settings(CLIENT3_ORDER_RULE));
+CLIENT3_SETTINGS(CLIENT3_RULES, )
+#undef CLIENT3_RULES
+#undef CLIENT3_ORDER_RULE
+#undef CLIENT3_FIELD_RULE
 
-constexpr FieldRule kCircleFit[] = {
-    {"Enabled", "true"}, {"NumThreads", "0", 0, 64}, {"EnableVideoCentroids", "false"},
-};
-constexpr FieldRule kReconstruct[] = {
-    {"EnvironmentalDriftTolerance", "1.5", 0, 10},
-    {"MinCamsToStartTrajectory", "3", 2, 16},
-    {"MinCamsToContinueTrajectory", "2", 2, 16},
-    {"ReconMinSeparation", "14", 0, 1000},
-    {"MinCentroidRadius", "0", 0, 50},
-    {"MaxCentroidRadius", "50", 0, 1000},
-    {"MinReconstructionRadius", "0", 0, 100},
-    {"MaxReconstructionRadius", "1000", 0, 10000},
-    {"FitMethod", "Fast", 0, 0, "Fast|Accurate"},
-    {"PredicationMatchFactor", "1", 0, 10},
-    {"MinTrajectoryLength", "2", 1, 1000},
-    {"StartupError", "150", 0, 1000},
-    {"PredicationError", "150", 0, 1000},
-    {"ComputeRadius", "true"},
-    {"MinVolumeX", "-10000", -kVolume, kVolume},
-    {"MinVolumeY", "-10000", -kVolume, kVolume},
-    {"MinVolumeZ", "-1000", -kVolume, kVolume},
-    {"MaxVolumeX", "10000", -kVolume, kVolume},
-    {"MaxVolumeY", "10000", -kVolume, kVolume},
-    {"MaxVolumeZ", "5000", -kVolume, kVolume},
-    {"NumThreads", "0", 0, 64},
-};
-constexpr OrderRule kReconstructOrder[] = {
-    {"MinCamsToContinueTrajectory", "MinCamsToStartTrajectory"},
-    {"MinCentroidRadius", "MaxCentroidRadius"},
-    {"MinReconstructionRadius", "MaxReconstructionRadius"},
-    {"MinVolumeX", "MaxVolumeX"},
-    {"MinVolumeY", "MaxVolumeY"},
-    {"MinVolumeZ", "MaxVolumeZ"},
-};
-constexpr FieldRule kLabelROM[] = {
-    {"StandardDeviation", "2", 0.1, 10}, {"SeparationDistance", "30", 0, 500},
-};
-constexpr FieldRule kLabeling[] = {
-    {"UseLabelingClusters", "true"},
-    {"LabelCompletenessEntranceThreshold", "0.75", 0, 1},
-    {"UseRobustBooting", "true"},
-    {"BootingQuality", "0.5", 0, 1},
-    {"BootingVersusTracking", "1", 0, 10},
-    {"TrackingQuality", "0.5", 0, 1},
-    {"SmoothingFactor", "0.5", 0, 1},
-    {"SinglePassLabel", "false"},
-    {"NumThreads", "0", 0, 64},
-};
-constexpr FieldRule kLabelingSubjectCalibration[] = {
-    {"RestImportance", "1", 0, 100},
-    {"MarkerImportance", "1", 0, 100},
-    {"SegmentImportance", "1", 0, 100},
-    {"Quality", "Medium", 0, 0, "Low|Medium|High"},
-    {"StatsMode", "Full", 0, 0, "Full|Basic"},
-    {"CalibrationMode", "Static", 0, 0, "Static|Dynamic"},
-    {"ActiveFrames", "200", 1, 100000},
-    {"AutoSaveZSK", "false"},
-    {"AutoSavePreCalHDF", "false"},
-    {"OverwriteRangeTemplates", "false"},
-    {"ShowCovariance", "false"},
-};
-constexpr FieldRule kOcclusionFixing[] = {
-    {"Enabled", "true"},
-    {"ApplyFixedMarkers", "true"},
-    {"MarkerSmoothing", "0", 0, 1},
-    {"DataFidelity", "1", 0, 1},
-    {"TransitionTime", "0.5", 0, 10},
-};
-constexpr FieldRule kSolving[] = {
-    {"PriorImportance", "1", 0, 100},
-    {"MeanPoseRatio", "1", 0, 10},
-    {"NumThreads", "0", 0, 64},
-    {"ExtrapolateFingers", "false"},
-    {"FingerMultiplier", "1", 0, 10},
-};
-
-const RecordRule kRecords[kRecordCount] = {
-    {"CircleFit", Id::OfflineGetCircleFitSettings, Id::OfflineSetCircleFitSettings, kCircleFit, {}},
-    {"Reconstruct", Id::OfflineGetReconstructSettings, Id::OfflineSetReconstructSettings, kReconstruct, kReconstructOrder},
-    {"LabelROM", Id::OfflineGetLabelROMSettings, Id::OfflineSetLabelROMSettings, kLabelROM, {}},
-    {"Labeling", Id::OfflineGetLabelingSettings, Id::OfflineSetLabelingSettings, kLabeling, {}},
-    {"LabelingSubjectCalibration", Id::OfflineGetLabelingSubjectCalibrationSettings,
-     Id::OfflineSetLabelingSubjectCalibrationSettings, kLabelingSubjectCalibration, {}},
-    {"OcclusionFixing", Id::OfflineGetOcclusionFixingSettings, Id::OfflineSetOcclusionFixingSettings, kOcclusionFixing, {}},
-    {"Solving", Id::OfflineGetSolvingSettings, Id::OfflineSetSolvingSettings, kSolving, {}},
-};
+#define CLIENT3_RECORD_RULE(X, record, what)                                                                          \
+  {#record, Id::OfflineGet##record##Settings, Id::OfflineSet##record##Settings, k##record##Fields, k##record##Order},
+const RecordRule kRecords[kRecordCount] = {CLIENT3_SETTINGS(CLIENT3_RECORD_RULE, )};
+#undef CLIENT3_RECORD_RULE
 
 const RecordRule& RuleOf(Record record) { return kRecords[static_cast<std::size_t>(record)]; }
 
-// The rules must name the catalogue's fields in its order; a mismatch is a fault of this program.
-const RecordRule& Checked(Record record) {
-  static const bool checked = [] {
-    for (const RecordRule& rule : kRecords) {
-      auto declared = protocol::CommandOf(rule.get).out;
-      bool same = declared.size() == rule.fields.size();
-      for (std::size_t i = 0; same && i < declared.size(); ++i) same = declared[i].name == rule.fields[i].name;
-      if (!same) LogLine("error", "the settings rules of '" + std::string(rule.name) + "' do not match the catalogue"), std::abort();
-    }
-    return true;
-  }();
-  (void)checked;
-  return RuleOf(record);
-}
-
 std::size_t FieldIndex(Record record, std::string_view field) {
-  const RecordRule& rule = Checked(record);
+  const RecordRule& rule = RuleOf(record);
   for (std::size_t i = 0; i < rule.fields.size(); ++i)
     if (rule.fields[i].name == field) return i;
   LogLine("error", "no settings field '" + std::string(field) + "' in '" + std::string(rule.name) + "'");
@@ -203,7 +127,7 @@ std::string Problem(const RecordRule& rule, const std::vector<std::string>& text
 
 template <Record R>
 void Get(Context& context, Reader&, Writer& out) {
-  const RecordRule& rule = Checked(R);
+  const RecordRule& rule = RuleOf(R);
   auto declared = protocol::CommandOf(rule.get).out;
   const std::vector<std::string>& values = context.scene.settings.values[static_cast<std::size_t>(R)];
   for (std::size_t i = 0; i < declared.size(); ++i) FromText(values[i], declared[i].type, out);
@@ -211,7 +135,7 @@ void Get(Context& context, Reader&, Writer& out) {
 
 template <Record R>
 void Set(Context& context, Reader& in, Writer&) {
-  const RecordRule& rule = Checked(R);
+  const RecordRule& rule = RuleOf(R);
   std::vector<std::string> texts;
   for (const protocol::Param& p : protocol::CommandOf(rule.set).in) {
     std::string text = ToText(in, p.type);
@@ -228,14 +152,11 @@ void Set(Context& context, Reader& in, Writer&) {
   LogLine("info", "settings " + std::string(rule.name) + " set: " + context.scene.settings.Summary(R));
 }
 
-#define CLIENT3_SETTINGS(record)                                                   \
-  {Id::OfflineGet##record##Settings, &Get<Record::record>, Access::Read}, {Id::OfflineSet##record##Settings, &Set<Record::record>}
-constexpr HandlerEntry kHandlers[] = {
-    CLIENT3_SETTINGS(CircleFit),        CLIENT3_SETTINGS(Reconstruct),     CLIENT3_SETTINGS(LabelROM),
-    CLIENT3_SETTINGS(Labeling),         CLIENT3_SETTINGS(LabelingSubjectCalibration),
-    CLIENT3_SETTINGS(OcclusionFixing),  CLIENT3_SETTINGS(Solving),
-};
-#undef CLIENT3_SETTINGS
+#define CLIENT3_HANDLERS(X, record, what)                                 \
+  {Id::OfflineGet##record##Settings, &Get<Record::record>, Access::Read}, \
+  {Id::OfflineSet##record##Settings, &Set<Record::record>},
+constexpr HandlerEntry kHandlers[] = {CLIENT3_SETTINGS(CLIENT3_HANDLERS, )};
+#undef CLIENT3_HANDLERS
 
 }  // namespace
 
@@ -255,7 +176,7 @@ const std::string& Settings::Text(Record record, std::string_view field) const {
 }
 
 std::string Settings::Summary(Record record) const {
-  const RecordRule& rule = Checked(record);
+  const RecordRule& rule = RuleOf(record);
   std::string out;
   for (std::size_t i = 0; i < rule.fields.size(); ++i)
     out.append(i ? "," : "").append(rule.fields[i].name).append("=").append(values[static_cast<std::size_t>(record)][i]);
@@ -266,7 +187,7 @@ std::string_view RecordName(Record record) { return RuleOf(record).name; }
 
 std::string SetRecordFromText(Settings& settings, std::string_view name, const std::vector<std::string>& texts) {
   for (std::size_t r = 0; r < kRecordCount; ++r) {
-    const RecordRule& rule = Checked(static_cast<Record>(r));
+    const RecordRule& rule = RuleOf(static_cast<Record>(r));
     if (rule.name != name) continue;
     auto declared = protocol::CommandOf(rule.get).out;
     if (texts.size() != declared.size()) return "the " + std::string(name) + " settings need " + std::to_string(declared.size()) + " values";

@@ -9,18 +9,19 @@
 #include <string_view>
 #include <vector>
 
+#include "protocol/catalogue.h"
+
 namespace client3::host {
 
+// The records in the catalogue's order.
 enum class Record : std::size_t {
-  CircleFit,
-  Reconstruct,
-  LabelROM,
-  Labeling,
-  LabelingSubjectCalibration,
-  OcclusionFixing,
-  Solving,
+#define CLIENT3_RECORD(X, record, what) record,
+  CLIENT3_SETTINGS(CLIENT3_RECORD, )
+#undef CLIENT3_RECORD
 };
-inline constexpr std::size_t kRecordCount = 7;
+#define CLIENT3_RECORD(X, record, what) +1
+inline constexpr std::size_t kRecordCount = 0 CLIENT3_SETTINGS(CLIENT3_RECORD, );
+#undef CLIENT3_RECORD
 
 struct Settings {
   // Each record's field values as canonical text, in the order the catalogue declares the fields.

@@ -27,85 +27,20 @@ using client3::protocol::Reader;
 using client3::protocol::Type;
 using client3::protocol::Writer;
 
-// The fields of each record that a reply fills, in declaration order.
+// The fields of each record that a reply fills, in declaration order, as OutputFields.h lists them.
 template <class R>
 inline constexpr auto FieldsOf = std::tuple<>{};
-#define CLIENT3_FIELDS(R, ...) \
-  template <>                  \
-  inline constexpr auto FieldsOf<R> = std::tuple{__VA_ARGS__};
-#define F(R, name) &R::name
-CLIENT3_FIELDS(Output_GetServerInfo, F(Output_GetServerInfo, Program), F(Output_GetServerInfo, MajorVersion),
-               F(Output_GetServerInfo, MinorVersion), F(Output_GetServerInfo, PointVersion),
-               F(Output_GetServerInfo, ReleaseType))
-CLIENT3_FIELDS(Output_ProcessRequest, F(Output_ProcessRequest, OutputParameters))
-CLIENT3_FIELDS(Output_GetCommandList, F(Output_GetCommandList, Commands))
-CLIENT3_FIELDS(Output_GetCommandInfo, F(Output_GetCommandInfo, Name), F(Output_GetCommandInfo, Description),
-               F(Output_GetCommandInfo, InputParameters), F(Output_GetCommandInfo, OutputParameters))
-CLIENT3_FIELDS(Output_GetSceneName, F(Output_GetSceneName, Name), F(Output_GetSceneName, Path))
-CLIENT3_FIELDS(Output_GetSubjectNames, F(Output_GetSubjectNames, Names), F(Output_GetSubjectNames, Models),
-               F(Output_GetSubjectNames, Active))
-CLIENT3_FIELDS(Output_GetMarkerNames, F(Output_GetMarkerNames, Names))
-CLIENT3_FIELDS(Output_GetTrajectory, F(Output_GetTrajectory, X), F(Output_GetTrajectory, Y), F(Output_GetTrajectory, Z),
-               F(Output_GetTrajectory, E))
-CLIENT3_FIELDS(Output_GetBoneNames, F(Output_GetBoneNames, Names))
-CLIENT3_FIELDS(Output_GetRootBone, F(Output_GetRootBone, Name))
-CLIENT3_FIELDS(Output_GetBoneDetails, F(Output_GetBoneDetails, Parent), F(Output_GetBoneDetails, Children))
-CLIENT3_FIELDS(Output_GetConstraintNames, F(Output_GetConstraintNames, Names))
-CLIENT3_FIELDS(Output_GetConstraintDetails, F(Output_GetConstraintDetails, Active), F(Output_GetConstraintDetails, Source),
-               F(Output_GetConstraintDetails, Target), F(Output_GetConstraintDetails, Offset),
-               F(Output_GetConstraintDetails, Type))
-CLIENT3_FIELDS(Output_GetSubjectParamNames, F(Output_GetSubjectParamNames, Names))
-CLIENT3_FIELDS(Output_GetSubjectParamDetails, F(Output_GetSubjectParamDetails, Value),
-               F(Output_GetSubjectParamDetails, DefaultValue), F(Output_GetSubjectParamDetails, Unit),
-               F(Output_GetSubjectParamDetails, Required))
-CLIENT3_FIELDS(Output_GetObject, F(Output_GetObject, ID), F(Output_GetObject, Type))
-CLIENT3_FIELDS(Output_GetObjectList, F(Output_GetObjectList, IDList), F(Output_GetObjectList, TypeList))
-CLIENT3_FIELDS(Output_GetIntegerList, F(Output_GetIntegerList, Integers))
-CLIENT3_FIELDS(Output_GetString, F(Output_GetString, Str))
-CLIENT3_FIELDS(Output_GetAttribute, F(Output_GetAttribute, Type), F(Output_GetAttribute, Editable), F(Output_GetAttribute, Str))
-CLIENT3_FIELDS(Output_GetStringList, F(Output_GetStringList, Strings))
-CLIENT3_FIELDS(Output_GetInteger, F(Output_GetInteger, Value))
-CLIENT3_FIELDS(Output_GetUnsignedLong, F(Output_GetUnsignedLong, Value))
-CLIENT3_FIELDS(Output_GetUnsignedLongList, F(Output_GetUnsignedLongList, ValueList))
-CLIENT3_FIELDS(Output_GetFloat, F(Output_GetFloat, Value))
-CLIENT3_FIELDS(Output_CircleFitSettings, F(Output_CircleFitSettings, Enabled), F(Output_CircleFitSettings, NumThreads),
-               F(Output_CircleFitSettings, EnableVideoCentroids))
-CLIENT3_FIELDS(Output_ReconstructSettings, F(Output_ReconstructSettings, EnvironmentalDriftTolerance),
-               F(Output_ReconstructSettings, MinCamsToStartTrajectory), F(Output_ReconstructSettings, MinCamsToContinueTrajectory),
-               F(Output_ReconstructSettings, ReconMinSeparation), F(Output_ReconstructSettings, MinCentroidRadius),
-               F(Output_ReconstructSettings, MaxCentroidRadius), F(Output_ReconstructSettings, MinReconstructionRadius),
-               F(Output_ReconstructSettings, MaxReconstructionRadius), F(Output_ReconstructSettings, FitMethod),
-               F(Output_ReconstructSettings, PredicationMatchFactor), F(Output_ReconstructSettings, MinTrajectoryLength),
-               F(Output_ReconstructSettings, StartupError), F(Output_ReconstructSettings, PredicationError),
-               F(Output_ReconstructSettings, ComputeRadius), F(Output_ReconstructSettings, MinVolumeX),
-               F(Output_ReconstructSettings, MinVolumeY), F(Output_ReconstructSettings, MinVolumeZ),
-               F(Output_ReconstructSettings, MaxVolumeX), F(Output_ReconstructSettings, MaxVolumeY),
-               F(Output_ReconstructSettings, MaxVolumeZ), F(Output_ReconstructSettings, NumThreads))
-CLIENT3_FIELDS(Output_LabelROMSettings, F(Output_LabelROMSettings, StandardDeviation),
-               F(Output_LabelROMSettings, SeparationDistance))
-CLIENT3_FIELDS(Output_LabelingSettings, F(Output_LabelingSettings, UseLabelingClusters),
-               F(Output_LabelingSettings, LabelCompletenessEntranceThreshold), F(Output_LabelingSettings, UseRobustBooting),
-               F(Output_LabelingSettings, BootingQuality), F(Output_LabelingSettings, BootingVersusTracking),
-               F(Output_LabelingSettings, TrackingQuality), F(Output_LabelingSettings, SmoothingFactor),
-               F(Output_LabelingSettings, SinglePassLabel), F(Output_LabelingSettings, NumThreads))
-CLIENT3_FIELDS(Output_LabelingSubjectCalibrationSettings, F(Output_LabelingSubjectCalibrationSettings, RestImportance),
-               F(Output_LabelingSubjectCalibrationSettings, MarkerImportance),
-               F(Output_LabelingSubjectCalibrationSettings, SegmentImportance),
-               F(Output_LabelingSubjectCalibrationSettings, Quality), F(Output_LabelingSubjectCalibrationSettings, StatsMode),
-               F(Output_LabelingSubjectCalibrationSettings, CalibrationMode),
-               F(Output_LabelingSubjectCalibrationSettings, ActiveFrames),
-               F(Output_LabelingSubjectCalibrationSettings, AutoSaveZSK),
-               F(Output_LabelingSubjectCalibrationSettings, AutoSavePreCalHDF),
-               F(Output_LabelingSubjectCalibrationSettings, OverwriteRangeTemplates),
-               F(Output_LabelingSubjectCalibrationSettings, ShowCovariance))
-CLIENT3_FIELDS(Output_OcclusionFixingSettings, F(Output_OcclusionFixingSettings, Enabled),
-               F(Output_OcclusionFixingSettings, ApplyFixedMarkers), F(Output_OcclusionFixingSettings, MarkerSmoothing),
-               F(Output_OcclusionFixingSettings, DataFidelity), F(Output_OcclusionFixingSettings, TransitionTime))
-CLIENT3_FIELDS(Output_SolvingSettings, F(Output_SolvingSettings, PriorImportance), F(Output_SolvingSettings, MeanPoseRatio),
-               F(Output_SolvingSettings, NumThreads), F(Output_SolvingSettings, ExtrapolateFingers),
-               F(Output_SolvingSettings, FingerMultiplier))
-#undef F
+#define CLIENT3_MEMBER(type, name, ...) &Record::name,
+#define CLIENT3_FIELDS(R)                                \
+  template <>                                            \
+  inline constexpr auto FieldsOf<R> = [] {               \
+    using Record = R;                                    \
+    return std::tuple{ZARVO_FIELDS_##R(CLIENT3_MEMBER)}; \
+  }();
+ZARVO_RESULT_RECORDS(CLIENT3_FIELDS)
+ZARVO_SETTINGS_RECORDS(CLIENT3_FIELDS)
 #undef CLIENT3_FIELDS
+#undef CLIENT3_MEMBER
 
 // ---- Types on the wire ------------------------------------------------------------------------
 
@@ -280,6 +215,33 @@ template <Id C, class R, class... A>
 R Ask(ClientConnection* connection, A const&... args) {
   static_assert(OutputsAre<C, R>(), "the command's outputs are not the record's fields");
   return Exchange<C, R>(connection, [](Reader& r, R& record) { ReadFields(r, record); }, args...);
+}
+
+// A settings record sent as its fields, the command's inputs.
+template <Id C, class R, class S>
+R SendFields(ClientConnection* connection, S const& settings) {
+  return std::apply([&](auto... field) { return Ask<C, R>(connection, settings.*field...); }, FieldsOf<S>);
+}
+
+// A member's request, shaped by what the member returns and takes: a record whose fields are the
+// command's outputs; the one value a command gives (a number); whether a command without outputs
+// succeeded (a bool); a settings record as its argument is sent field by field as the inputs.
+template <Id C, class R, class... A>
+R Call(ClientConnection* connection, A&... args) {
+  if constexpr (sizeof...(A) == 1 && (std::is_base_of_v<Output_Result, A> && ...)) {
+    return SendFields<C, R>(connection, args...);
+  } else if constexpr (std::is_base_of_v<Output_Result, R>) {
+    return Ask<C, R>(connection, args...);
+  } else if constexpr (std::is_same_v<R, bool>) {
+    static_assert(CommandOf(C).out.empty(), "a member that returns bool tells whether a command without outputs succeeded");
+    return Ask<C, Output_Result>(connection, args...).Result == ResultCode::Success;
+  } else {
+    static_assert(CommandOf(C).out.size() == 1 && CommandOf(C).out[0].type == WireOf<R>::value,
+                  "a member that returns a number returns its command's one output");
+    R value{};
+    Exchange<C, Output_Result>(connection, [&](Reader& r, Output_Result&) { Read(r, value); }, args...);
+    return value;
+  }
 }
 
 }  // namespace request

@@ -10,12 +10,19 @@
 #pragma once
 
 #include <cstddef>
+#include <span>
 #include <type_traits>
 #include <vector>
 
+#include "convert/scalar.h"
+#include "convert/text.h"
 #include "runtime/wrap.h"
+#include "types/types.h"
 
 namespace client3 {
+
+// Type_Parameter's and the Output_* records' module functions (records.cpp).
+std::span<const PyMethodDef> RecordFunctions();
 
 namespace record {
 
@@ -135,12 +142,15 @@ struct Field {
                       Fn<cat(X, "_", Name, "_get"), Object, Get<Member>, Self<Class>>>;
 };
 
-// A member function without arguments.
+// A member function without arguments; its result is converted here, where the text conversion is
+// known.
+template <auto Function>
+inline constexpr auto Converted = [](auto* self) { return ToPython((self->*Function)()); };
 template <Text Name, auto Function>
 struct Method {
   using Class = typename SelfOf<decltype(Function)>::Class;
   template <Text X>
-  using Lines = Fn<cat(X, "_", Name), Object, Function, typename SelfOf<decltype(Function)>::type>;
+  using Lines = Fn<cat(X, "_", Name), Object, Converted<Function>, typename SelfOf<decltype(Function)>::type>;
 };
 
 // A record that scripts receive from the client: delete_X, its members, X_swigregister.

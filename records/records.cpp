@@ -1,7 +1,6 @@
-// Type_Parameter and the Output_* records: one entry per record, listing its fields (and member
-// functions) in declaration order.
+// Type_Parameter and the Output_* records: each record's fields (as the library's OutputFields.h
+// describes them) and then its member functions.
 #include "records/record.h"
-#include "runtime/module.h"
 
 namespace client3 {
 
@@ -10,172 +9,39 @@ namespace {
 using namespace ZarvoSDKClientCPP;
 using namespace record;
 
+// Each record's fields as table lines, in the order OutputFields.h lists them: As<Kind, Methods...> is
+// Kind<X, Field<...>..., Methods...>.
+template <class X>
+struct Described;
+#define CLIENT3_FIELD(type, name, ...) , Field<#name, &X::name>
+#define CLIENT3_DESCRIBED(R)                                        \
+  template <>                                                       \
+  struct Described<R> {                                             \
+    using X = R;                                                    \
+    template <template <class...> class Kind, class... Methods>     \
+    using As = Kind<R ZARVO_FIELDS_##R(CLIENT3_FIELD), Methods...>; \
+  };
+CLIENT3_DESCRIBED(Type_Parameter)
+CLIENT3_DESCRIBED(Output_Result)
+ZARVO_RESULT_RECORDS(CLIENT3_DESCRIBED)
+ZARVO_SETTINGS_RECORDS(CLIENT3_DESCRIBED)
+#undef CLIENT3_DESCRIBED
+#undef CLIENT3_FIELD
+
+#define CLIENT3_RECORD(R) , Described<R>::As<Record>
+#define CLIENT3_CREATABLE(R) , Described<R>::As<Creatable>
 using Functions = Table<
-    Creatable<Type_Parameter,
-              Field<"Name", &Type_Parameter::Name>,
-              Field<"Value", &Type_Parameter::Value>>,
-
+    Described<Type_Parameter>::As<Creatable>,
     // The protocol records.
-    Record<Output_Result,
-           Field<"Result", &Output_Result::Result>,
-           Field<"ResultString", &Output_Result::ResultString>,
-           Method<"Error", &Output_Result::Error>>,
-    Record<Output_ProcessRequest,
-           Field<"OutputParameters", &Output_ProcessRequest::OutputParameters>>,
-    Record<Output_GetServerInfo,
-           Field<"Program", &Output_GetServerInfo::Program>,
-           Field<"MajorVersion", &Output_GetServerInfo::MajorVersion>,
-           Field<"MinorVersion", &Output_GetServerInfo::MinorVersion>,
-           Field<"PointVersion", &Output_GetServerInfo::PointVersion>,
-           Field<"ReleaseType", &Output_GetServerInfo::ReleaseType>>,
-    Record<Output_GetCommandList,
-           Field<"Commands", &Output_GetCommandList::Commands>>,
-    Record<Output_GetCommandInfo,
-           Field<"Name", &Output_GetCommandInfo::Name>,
-           Field<"Description", &Output_GetCommandInfo::Description>,
-           Field<"InputParameters", &Output_GetCommandInfo::InputParameters>,
-           Field<"OutputParameters", &Output_GetCommandInfo::OutputParameters>,
-           Method<"DefaultOutputString", &Output_GetCommandInfo::DefaultOutputString>>,
-
+    Described<Output_Result>::As<Record, Method<"Error", &Output_Result::Error>>
+    ZARVO_PROTOCOL_RECORDS(CLIENT3_RECORD),
+    Described<Output_GetCommandInfo>::As<Record, Method<"DefaultOutputString", &Output_GetCommandInfo::DefaultOutputString>>
     // The query results.
-    Record<Output_GetSceneName,
-           Field<"Name", &Output_GetSceneName::Name>,
-           Field<"Path", &Output_GetSceneName::Path>>,
-    Record<Output_GetSubjectNames,
-           Field<"Names", &Output_GetSubjectNames::Names>,
-           Field<"Models", &Output_GetSubjectNames::Models>,
-           Field<"Active", &Output_GetSubjectNames::Active>>,
-    Record<Output_GetMarkerNames,
-           Field<"Names", &Output_GetMarkerNames::Names>>,
-    Record<Output_HasTrajectory,
-           Field<"Exists", &Output_HasTrajectory::Exists>>,
-    Record<Output_GetTrajectory,
-           Field<"X", &Output_GetTrajectory::X>,
-           Field<"Y", &Output_GetTrajectory::Y>,
-           Field<"Z", &Output_GetTrajectory::Z>,
-           Field<"E", &Output_GetTrajectory::E>>,
-    Record<Output_GetTrajectoryAtFrame,
-           Field<"X", &Output_GetTrajectoryAtFrame::X>,
-           Field<"Y", &Output_GetTrajectoryAtFrame::Y>,
-           Field<"Z", &Output_GetTrajectoryAtFrame::Z>,
-           Field<"E", &Output_GetTrajectoryAtFrame::E>>,
-    Record<Output_GetBoneNames,
-           Field<"Names", &Output_GetBoneNames::Names>>,
-    Record<Output_GetRootBone,
-           Field<"Name", &Output_GetRootBone::Name>>,
-    Record<Output_GetBoneDetails,
-           Field<"Parent", &Output_GetBoneDetails::Parent>,
-           Field<"Children", &Output_GetBoneDetails::Children>>,
-    Record<Output_GetConstraintNames,
-           Field<"Names", &Output_GetConstraintNames::Names>>,
-    Record<Output_GetConstraintDetails,
-           Field<"Active", &Output_GetConstraintDetails::Active>,
-           Field<"Source", &Output_GetConstraintDetails::Source>,
-           Field<"Target", &Output_GetConstraintDetails::Target>,
-           Field<"Offset", &Output_GetConstraintDetails::Offset>,
-           Field<"Type", &Output_GetConstraintDetails::Type>>,
-    Record<Output_GetSubjectParamNames,
-           Field<"Names", &Output_GetSubjectParamNames::Names>>,
-    Record<Output_GetSubjectParamDetails,
-           Field<"Value", &Output_GetSubjectParamDetails::Value>,
-           Field<"DefaultValue", &Output_GetSubjectParamDetails::DefaultValue>,
-           Field<"Unit", &Output_GetSubjectParamDetails::Unit>,
-           Field<"Required", &Output_GetSubjectParamDetails::Required>>,
-    Record<Output_GetObject,
-           Field<"ID", &Output_GetObject::ID>,
-           Field<"Type", &Output_GetObject::Type>>,
-    Record<Output_GetObjectList,
-           Field<"IDList", &Output_GetObjectList::IDList>,
-           Field<"TypeList", &Output_GetObjectList::TypeList>>,
-    Record<Output_GetIntegerList,
-           Field<"Integers", &Output_GetIntegerList::Integers>>,
-    Record<Output_GetString,
-           Field<"Str", &Output_GetString::Str>>,
-    Record<Output_GetAttribute,
-           Field<"Type", &Output_GetAttribute::Type>,
-           Field<"Editable", &Output_GetAttribute::Editable>,
-           Field<"Str", &Output_GetAttribute::Str>>,
-    Record<Output_GetStringList,
-           Field<"Strings", &Output_GetStringList::Strings>>,
-    Record<Output_GetInteger,
-           Field<"Value", &Output_GetInteger::Value>>,
-    Record<Output_GetUnsignedLong,
-           Field<"Value", &Output_GetUnsignedLong::Value>>,
-    Record<Output_GetUnsignedLongList,
-           Field<"ValueList", &Output_GetUnsignedLongList::ValueList>>,
-    Record<Output_GetFloat,
-           Field<"Value", &Output_GetFloat::Value>>,
-    Record<Output_GetTakeInfo,
-           Field<"Name", &Output_GetTakeInfo::Name>,
-           Field<"Desc", &Output_GetTakeInfo::Desc>,
-           Field<"Notes", &Output_GetTakeInfo::Notes>>,
-
+    ZARVO_QUERY_RECORDS(CLIENT3_RECORD)
     // The processing settings, which scripts also create.
-    Creatable<Output_CircleFitSettings,
-              Field<"Enabled", &Output_CircleFitSettings::Enabled>,
-              Field<"NumThreads", &Output_CircleFitSettings::NumThreads>,
-              Field<"EnableVideoCentroids", &Output_CircleFitSettings::EnableVideoCentroids>>,
-    Creatable<Output_ReconstructSettings,
-              Field<"EnvironmentalDriftTolerance", &Output_ReconstructSettings::EnvironmentalDriftTolerance>,
-              Field<"MinCamsToStartTrajectory", &Output_ReconstructSettings::MinCamsToStartTrajectory>,
-              Field<"MinCamsToContinueTrajectory", &Output_ReconstructSettings::MinCamsToContinueTrajectory>,
-              Field<"ReconMinSeparation", &Output_ReconstructSettings::ReconMinSeparation>,
-              Field<"MinCentroidRadius", &Output_ReconstructSettings::MinCentroidRadius>,
-              Field<"MaxCentroidRadius", &Output_ReconstructSettings::MaxCentroidRadius>,
-              Field<"MinReconstructionRadius", &Output_ReconstructSettings::MinReconstructionRadius>,
-              Field<"MaxReconstructionRadius", &Output_ReconstructSettings::MaxReconstructionRadius>,
-              Field<"FitMethod", &Output_ReconstructSettings::FitMethod>,
-              Field<"PredicationMatchFactor", &Output_ReconstructSettings::PredicationMatchFactor>,
-              Field<"MinTrajectoryLength", &Output_ReconstructSettings::MinTrajectoryLength>,
-              Field<"StartupError", &Output_ReconstructSettings::StartupError>,
-              Field<"PredicationError", &Output_ReconstructSettings::PredicationError>,
-              Field<"ComputeRadius", &Output_ReconstructSettings::ComputeRadius>,
-              Field<"MinVolumeX", &Output_ReconstructSettings::MinVolumeX>,
-              Field<"MinVolumeY", &Output_ReconstructSettings::MinVolumeY>,
-              Field<"MinVolumeZ", &Output_ReconstructSettings::MinVolumeZ>,
-              Field<"MaxVolumeX", &Output_ReconstructSettings::MaxVolumeX>,
-              Field<"MaxVolumeY", &Output_ReconstructSettings::MaxVolumeY>,
-              Field<"MaxVolumeZ", &Output_ReconstructSettings::MaxVolumeZ>,
-              Field<"NumThreads", &Output_ReconstructSettings::NumThreads>>,
-    Creatable<Output_LabelingSettings,
-              Field<"UseLabelingClusters", &Output_LabelingSettings::UseLabelingClusters>,
-              Field<"LabelCompletenessEntranceThreshold", &Output_LabelingSettings::LabelCompletenessEntranceThreshold>,
-              Field<"UseRobustBooting", &Output_LabelingSettings::UseRobustBooting>,
-              Field<"BootingQuality", &Output_LabelingSettings::BootingQuality>,
-              Field<"BootingVersusTracking", &Output_LabelingSettings::BootingVersusTracking>,
-              Field<"TrackingQuality", &Output_LabelingSettings::TrackingQuality>,
-              Field<"SmoothingFactor", &Output_LabelingSettings::SmoothingFactor>,
-              Field<"SinglePassLabel", &Output_LabelingSettings::SinglePassLabel>,
-              Field<"NumThreads", &Output_LabelingSettings::NumThreads>>,
-    Creatable<Output_OcclusionFixingSettings,
-              Field<"Enabled", &Output_OcclusionFixingSettings::Enabled>,
-              Field<"ApplyFixedMarkers", &Output_OcclusionFixingSettings::ApplyFixedMarkers>,
-              Field<"MarkerSmoothing", &Output_OcclusionFixingSettings::MarkerSmoothing>,
-              Field<"DataFidelity", &Output_OcclusionFixingSettings::DataFidelity>,
-              Field<"TransitionTime", &Output_OcclusionFixingSettings::TransitionTime>>,
-    Creatable<Output_SolvingSettings,
-              Field<"PriorImportance", &Output_SolvingSettings::PriorImportance>,
-              Field<"MeanPoseRatio", &Output_SolvingSettings::MeanPoseRatio>,
-              Field<"NumThreads", &Output_SolvingSettings::NumThreads>,
-              Field<"ExtrapolateFingers", &Output_SolvingSettings::ExtrapolateFingers>,
-              Field<"FingerMultiplier", &Output_SolvingSettings::FingerMultiplier>>,
-    Creatable<Output_LabelingSubjectCalibrationSettings,
-              Field<"RestImportance", &Output_LabelingSubjectCalibrationSettings::RestImportance>,
-              Field<"MarkerImportance", &Output_LabelingSubjectCalibrationSettings::MarkerImportance>,
-              Field<"SegmentImportance", &Output_LabelingSubjectCalibrationSettings::SegmentImportance>,
-              Field<"Quality", &Output_LabelingSubjectCalibrationSettings::Quality>,
-              Field<"StatsMode", &Output_LabelingSubjectCalibrationSettings::StatsMode>,
-              Field<"CalibrationMode", &Output_LabelingSubjectCalibrationSettings::CalibrationMode>,
-              Field<"ActiveFrames", &Output_LabelingSubjectCalibrationSettings::ActiveFrames>,
-              Field<"AutoSaveZSK", &Output_LabelingSubjectCalibrationSettings::AutoSaveZSK>,
-              Field<"AutoSavePreCalHDF", &Output_LabelingSubjectCalibrationSettings::AutoSavePreCalHDF>,
-              Field<"OverwriteRangeTemplates", &Output_LabelingSubjectCalibrationSettings::OverwriteRangeTemplates>,
-              Field<"ShowCovariance", &Output_LabelingSubjectCalibrationSettings::ShowCovariance>>,
-    Creatable<Output_LabelROMSettings,
-              Field<"StandardDeviation", &Output_LabelROMSettings::StandardDeviation>,
-              Field<"SeparationDistance", &Output_LabelROMSettings::SeparationDistance>>>;
-
-static_assert(Functions::defs.size() == 328);
+    ZARVO_SETTINGS_RECORDS(CLIENT3_CREATABLE)>;
+#undef CLIENT3_RECORD
+#undef CLIENT3_CREATABLE
 
 }  // namespace
 

@@ -58,6 +58,21 @@ struct ClientData {
 // The module that links this copy of the runtime provides its record.
 extern ModuleInfo thisModule;
 
+// The descriptor in use for a type: this module's own, or the one another module of the family
+// registered first.
+inline TypeInfo* Type(int id) { return thisModule.types[id]; }
+
+// The index of each native C++ type's descriptor in the module's table; the module's list of types
+// gives them (-1: no descriptor).
+template <class T>
+inline constexpr int TypeOf = -1;
+
+template <class T>
+inline TypeInfo* TypeFor() {
+  static_assert(TypeOf<T> >= 0, "no descriptor for this type");
+  return Type(TypeOf<T>);
+}
+
 // ---- Proxy objects ----------------------------------------------------------------------------
 
 struct SwigPyObject {

@@ -65,6 +65,11 @@ constexpr auto decimal() {
   return out;
 }
 
+// The qualified C++ spelling of a wrapped class, as the messages name it; the module's list of types
+// gives them.
+template <class T>
+inline constexpr auto NameOf = Text{"?"};
+
 // The characters of a text, with static storage.
 template <Text T>
 inline constexpr const char* chars = T.chars;

@@ -25,11 +25,8 @@
 #include <type_traits>
 #include <utility>
 
-#include "convert/scalar.h"  // the result conversions must be declared before the templates
-#include "convert/text.h"
 #include "runtime/runtime.h"
 #include "runtime/text.h"
-#include "runtime/types.h"
 
 namespace client3 {
 
@@ -74,21 +71,6 @@ inline bool Load(K& kind, PyObject* object) {
 
 // ---- Pointer kinds ----------------------------------------------------------------------------
 
-// The qualified C++ spelling of each wrapped class, as the messages name it.
-template <class T>
-inline constexpr auto NameOf = Text{"?"};
-#define CLIENT3_NAME_OF(name) \
-  template <>                 \
-  inline constexpr auto NameOf<ZarvoSDKClientCPP::name> = Text{"ZarvoSDKClientCPP::" #name};
-CLIENT3_DERIVED_RECORDS(CLIENT3_NAME_OF)
-CLIENT3_NAME_OF(Output_Result)
-CLIENT3_NAME_OF(SafeString)
-CLIENT3_NAME_OF(Type_Parameter)
-CLIENT3_NAME_OF(ZarvoPelluxPostClient)
-#undef CLIENT3_NAME_OF
-template <>
-inline constexpr auto NameOf<swig::SwigPyIterator> = Text{"swig::SwigPyIterator"};
-
 enum class Null { Refuse, Allow };
 
 // A pointer argument converted to T's descriptor. A null pointer (None) is refused with the
@@ -123,6 +105,17 @@ inline constexpr auto Delete = [](T* object) { delete object; };
 
 // ---- Results ----------------------------------------------------------------------------------
 
+// What a target returns becomes a script object through ToPython: the numbers and booleans here, the
+// wrapped classes below; a family whose targets return other types converts them itself.
+inline PyObject* ToPython(int v) { return PyLong_FromLong(v); }
+inline PyObject* ToPython(unsigned int v) { return PyLong_FromSize_t(v); }
+inline PyObject* ToPython(bool v) { return PyBool_FromLong(v); }
+inline PyObject* ToPython(float v) { return PyFloat_FromDouble(v); }
+inline PyObject* ToPython(double v) { return PyFloat_FromDouble(v); }
+inline PyObject* ToPython(unsigned long long v) {
+  return v < 0x80000000ULL ? PyLong_FromLong(static_cast<long>(v)) : PyLong_FromUnsignedLongLong(v);
+}
+
 // A pointer into an object that someone else keeps: handed out as a non-owning proxy.
 template <class T>
 struct Borrowed {
@@ -147,14 +140,14 @@ inline PyObject* ToPython(PyObject* value) { return value; }
 
 // A record or string returned by value: a heap copy owned by its proxy.
 template <class T>
-  requires(TypeOf<T> != TypeCount)
+  requires(TypeOf<T> >= 0)
 PyObject* ToPython(const T& value) {
   return ToPython(Owned<T>{new T(value)});
 }
 // A record returned by a call is moved to the heap rather than copied: its vectors change owner
 // without being allocated and filled a second time.
 template <class T>
-  requires(TypeOf<T> != TypeCount && !std::is_reference_v<T>)
+  requires(TypeOf<T> >= 0 && !std::is_reference_v<T>)
 PyObject* ToPython(T&& value) {
   return ToPython(Owned<T>{new T(std::move(value))});
 }
@@ -237,14 +230,14 @@ struct Raw {
   static constexpr std::array<PyMethodDef, 1> defs{{{Name.chars, Body, Conv, nullptr}}};
 };
 
-template <TypeId Id>
+template <int Id>
 PyObject* RegisterWrapper(PyObject*, PyObject* args) {
   return RegisterClass(args, Type(Id));
 }
 inline PyObject* InitWrapper(PyObject*, PyObject* args) { return InitShadowInstance(args); }
 
 // "<Class>_swigregister" and "<Class>_swiginit".
-template <Text Class, TypeId Id>
+template <Text Class, int Id>
 struct Register {
   static constexpr std::array<PyMethodDef, 1> defs{
       {{chars<cat(Class, "_swigregister")>, RegisterWrapper<Id>, METH_O, nullptr}}};

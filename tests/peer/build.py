@@ -12,7 +12,7 @@ import hostproc
 HERE = os.path.dirname(os.path.abspath(__file__))
 ROOT = os.path.dirname(os.path.dirname(HERE))
 NAME = "_Client3Peer"
-SOURCES = ["runtime/proxy.cpp", "runtime/registry.cpp", "runtime/errors.cpp", "runtime/types.cpp",
+SOURCES = ["runtime/proxy.cpp", "runtime/registry.cpp", "runtime/errors.cpp", "types/types.cpp",
            "library/StringFactory.cpp"]
 
 

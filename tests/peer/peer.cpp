@@ -5,7 +5,7 @@
 
 #include "convert/text.h"
 #include "runtime/runtime.h"
-#include "runtime/types.h"
+#include "types/types.h"
 #include "runtime/wrap.h"
 
 namespace client3 {

@@ -1,5 +1,5 @@
 // This module's descriptor table, its cast lists and its record in the ring.
-#include "runtime/types.h"
+#include "types/types.h"
 
 namespace client3 {
 

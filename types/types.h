@@ -1,5 +1,6 @@
 // The native types that cross into scripts: one descriptor each, sorted by mangled name (the lookup
-// by mangled name is a binary search), with the readable spellings whose last one is shown.
+// by mangled name is a binary search), with the readable spellings whose last one is shown; the
+// descriptor of each C++ type that the wrappers convert, and the spelling of each class in messages.
 #pragma once
 
 #include <memory>
@@ -7,6 +8,7 @@
 #include <vector>
 
 #include "runtime/runtime.h"
+#include "runtime/text.h"
 #include "ZarvoSDKClientCPP/Outputs.h"
 #include "ZarvoSDKClientCPP/ZarvoPelluxPostClient.h"
 
@@ -113,31 +115,12 @@ enum TypeId : int {
   TypeCount
 };
 
-// The descriptor in use for a type: this module's own, or the one another module of the family
-// registered first.
-inline TypeInfo* Type(TypeId id) { return thisModule.types[id]; }
-
-// The descriptor of each native C++ type that wrappers convert.
-template <class T>
-inline constexpr TypeId TypeOf = TypeCount;
-
 #define CLIENT3_TYPE_OF(cxx, id) \
   template <>                    \
-  inline constexpr TypeId TypeOf<cxx> = id;
+  inline constexpr int TypeOf<cxx> = id;
 #define CLIENT3_RECORD_TYPE(name) CLIENT3_TYPE_OF(ZarvoSDKClientCPP::name, p_##name)
 // Every record derived from Output_Result.
-#define CLIENT3_DERIVED_RECORDS(X)                                                                            \
-  X(Output_ProcessRequest) X(Output_GetServerInfo) X(Output_GetCommandList)                   \
-  X(Output_GetCommandInfo) X(Output_GetSceneName) X(Output_GetSubjectNames) X(Output_GetMarkerNames)           \
-  X(Output_HasTrajectory) X(Output_GetTrajectory) X(Output_GetTrajectoryAtFrame) X(Output_GetBoneNames)        \
-  X(Output_GetRootBone) X(Output_GetBoneDetails) X(Output_GetConstraintNames) X(Output_GetConstraintDetails)   \
-  X(Output_GetSubjectParamNames) X(Output_GetSubjectParamDetails) X(Output_GetObject) X(Output_GetObjectList)  \
-  X(Output_GetIntegerList) X(Output_GetString) X(Output_GetAttribute) X(Output_GetStringList)                  \
-  X(Output_GetInteger) X(Output_GetUnsignedLong) X(Output_GetUnsignedLongList) X(Output_GetFloat)              \
-  X(Output_GetTakeInfo) X(Output_GetJointDetails) X(Output_GetJointNames) X(Output_GetRootSegment)             \
-  X(Output_GetSegmentDetails) X(Output_GetSegmentNames) X(Output_GetTrialName) X(Output_CircleFitSettings)     \
-  X(Output_ReconstructSettings) X(Output_LabelingSettings) X(Output_OcclusionFixingSettings)                    \
-  X(Output_SolvingSettings) X(Output_LabelingSubjectCalibrationSettings) X(Output_LabelROMSettings)
+#define CLIENT3_DERIVED_RECORDS(X) ZARVO_RESULT_RECORDS(X) ZARVO_LEGACY_RECORDS(X) ZARVO_SETTINGS_RECORDS(X)
 CLIENT3_DERIVED_RECORDS(CLIENT3_RECORD_TYPE)
 CLIENT3_RECORD_TYPE(Output_Result)
 CLIENT3_RECORD_TYPE(SafeString)
@@ -164,10 +147,17 @@ CLIENT3_TYPE_OF(char, p_char)
 #undef CLIENT3_RECORD_TYPE
 #undef CLIENT3_TYPE_OF
 
-template <class T>
-inline TypeInfo* TypeFor() {
-  static_assert(TypeOf<T> != TypeCount, "no descriptor for this type");
-  return Type(TypeOf<T>);
-}
+// The qualified C++ spelling of each wrapped class, as the messages name it.
+#define CLIENT3_NAME_OF(name) \
+  template <>                 \
+  inline constexpr auto NameOf<ZarvoSDKClientCPP::name> = Text{"ZarvoSDKClientCPP::" #name};
+CLIENT3_DERIVED_RECORDS(CLIENT3_NAME_OF)
+CLIENT3_NAME_OF(Output_Result)
+CLIENT3_NAME_OF(SafeString)
+CLIENT3_NAME_OF(Type_Parameter)
+CLIENT3_NAME_OF(ZarvoPelluxPostClient)
+#undef CLIENT3_NAME_OF
+template <>
+inline constexpr auto NameOf<swig::SwigPyIterator> = Text{"swig::SwigPyIterator"};
 
 }  // namespace client3

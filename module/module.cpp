@@ -1,10 +1,16 @@
-// The module entry: runtime singletons, the function table, the shared type ring and the result-code
-// constants.
+// The module entry: runtime singletons, the function table made of every family's functions, the
+// shared type ring and the result-code constants.
+#include <algorithm>
 #include <cstdlib>
 #include <cstring>
+#include <span>
 
-#include "runtime/module.h"
-#include "runtime/types.h"
+#include "client/client.h"
+#include "containers/iterators.h"
+#include "containers/sequence.h"
+#include "convert/text.h"
+#include "records/record.h"
+#include "runtime/runtime.h"
 
 namespace client3 {
 
@@ -22,18 +28,19 @@ struct Constant {
 enum { ConstantPointer = 4, ConstantPacked = 5 };
 Constant constantTable[] = {{0, nullptr, 0, 0.0, nullptr, nullptr}};
 
-constexpr std::size_t kFunctionCount = 705;
-PyMethodDef functionTable[kFunctionCount + 1];
-
-std::size_t BuildFunctionTable() {
+// Every family's functions, in the order the module lists them, and the terminator: the table is
+// as long as the families make it. It is kept for the life of the process, as the functions made
+// from it point into it.
+PyMethodDef* BuildFunctionTable() {
+  const std::span<const PyMethodDef> families[] = {IteratorFunctions(), VectorFunctions(), SafeStringFunctions(),
+                                                   RecordFunctions(), ClientFunctions()};
   std::size_t count = 0;
-  for (auto family : {IteratorFunctions(), VectorFunctions(), SafeStringFunctions(), RecordFunctions(),
-                      ClientFunctions()}) {
-    for (const PyMethodDef& def : family)
-      if (count < kFunctionCount) functionTable[count++] = def;
-  }
-  functionTable[count] = {nullptr, nullptr, 0, nullptr};
-  return count;
+  for (auto family : families) count += family.size();
+  auto* table = new PyMethodDef[count + 1];
+  PyMethodDef* end = table;
+  for (auto family : families) end = std::copy(family.begin(), family.end(), end);
+  *end = {nullptr, nullptr, 0, nullptr};
+  return table;
 }
 
 // Points the docs that name a pointer constant ("swig_ptr: NAME") at the constant's value.
@@ -127,8 +134,7 @@ PyMODINIT_FUNC PyInit__Client3() {
   TypeCache();
   SwigPyPacked_type();
   SwigPyObject_type();
-  static std::size_t built = BuildFunctionTable();
-  (void)built;
+  static PyMethodDef* const functionTable = BuildFunctionTable();
   FixMethodDocs(functionTable);
   PyObject* module = PyModule_Create2(&moduleDef, 1013);
   if (!module) return nullptr;
