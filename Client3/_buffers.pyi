@@ -1,4 +1,4 @@
-# Written by Client3/_generate.py from the module's function table; do not edit by hand.
+# Written by Client3/_generate.py from the library's declared interface; do not edit by hand.
 from typing import Any, List, Union
 
 def copy(v: Any) -> Union[memoryview, List[str]]: ...
