@@ -580,9 +580,9 @@ def _make(name: str, members: Members, classes: dict[str, type]) -> type:
 # ---- Client methods ------------------------------------------------------------------------------
 #
 # Each method of the client is a real function whose parameters carry the names of its command's
-# inputs, so that help(), inspect.signature, keywords and editors see them. One template per number
-# of parameters (and per place of a path among them) is compiled once; each method is the template's
-# code with its own names, calling its module function through a closure.
+# inputs, so that help(), inspect.signature, keywords and editors see them. The templates, one per
+# number of parameters, are compiled together once; each method is a template's code with its own
+# names, calling its module function through a closure.
 
 # Arguments the module refuses with one of these get a note naming the method and the parameter.
 _REFUSED = (TypeError, ValueError, OverflowError)

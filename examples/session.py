@@ -26,8 +26,6 @@ import matplotlib.pyplot as plt  # noqa: E402
 import Client3  # noqa: E402
 from Client3.testing import running_host  # noqa: E402
 
-FRAME_RATE = 100.0  # frames per second of the demo scene; the application has no frame-rate command yet
-
 
 def gaps(seen: Sequence[bool]) -> List[Tuple[int, int]]:
     """The runs of frames where the marker is not seen, as (first, last) frame numbers."""
@@ -60,7 +58,8 @@ def account(client: Client3.ZarvoPelluxPostClient) -> None:
 
     frames = client.GetFrameCount()
     scene = client.GetSceneName().check()
-    print(f"scene '{scene.Name}', frames 1 to {frames} at {FRAME_RATE:g} Hz ({frames / FRAME_RATE:g} s)")
+    rate = client.TimelineGetFrameRate().check().Value
+    print(f"scene '{scene.Name}', frames 1 to {frames} at {rate:g} Hz ({frames / rate:g} s)")
 
     subjects = client.GetSubjectNames().check()
     for subject in subjects.Names:
@@ -135,10 +134,11 @@ def plot(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str, path:
     filled = [index for index, (was, now) in enumerate(zip(seen, after.E)) if now and not was]
     print(f"occlusion fixing and a 6 Hz low-pass: {len(filled)} frames of {subject}'s {marker} filled")
 
-    seconds = [index / FRAME_RATE for index in range(len(seen))]
+    rate = client.TimelineGetFrameRate().check().Value
+    seconds = [index / rate for index in range(len(seen))]
     runs = gaps(seen)
     first, last = max(runs, key=lambda run: run[1] - run[0]) if runs else (1, len(seen))
-    margin = int(FRAME_RATE * 0.3)
+    margin = int(rate * 0.3)
     start, end = max(first - 1 - margin, 0), min(last - 1 + margin, len(seen) - 1)
     figure, rows = plt.subplots(3, 2, figsize=(12, 8), sharex="col", gridspec_kw={"width_ratios": (2, 1)})
     for (whole, zoom), name, captured, processed in zip(
@@ -147,7 +147,7 @@ def plot(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str, path:
             draw(axes, seconds, list(captured), seen, list(processed), filled)
             axes.grid(alpha=0.3)
         for number, (gap_first, gap_last) in enumerate(runs):
-            whole.axvspan((gap_first - 1) / FRAME_RATE, gap_last / FRAME_RATE, color="red", alpha=0.15,
+            whole.axvspan((gap_first - 1) / rate, gap_last / rate, color="red", alpha=0.15,
                           label="gap" if number == 0 else None)
         whole.set_ylabel(f"{name} (mm)")
         zoom.set_xlim(seconds[start], seconds[end])
