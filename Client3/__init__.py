@@ -695,6 +695,13 @@ def make_{arity}_{checked}(call, operation):
             raise _chained from _error
 {tail}    return method
 """
+# Without parameters there is no argument to refuse.
+_WITHOUT_PARAMETERS = """
+def make_0_{checked}(call, operation):
+    def method(self):
+        {answer}call(self)
+{tail}    return method
+"""
 _CHECKED = """        _failed = failure(self, operation, _result)
         if _failed is not None:
             raise _failed
@@ -709,7 +716,7 @@ def _templates(most: int) -> dict[str, collections.abc.Callable[..., object]]:
     for arity in range(most + 1):
         names = [f"a{index}" for index in range(arity)]
         for checked in (False, True):
-            sources.append(_TEMPLATE.format(
+            sources.append((_TEMPLATE if arity else _WITHOUT_PARAMETERS).format(
                 arity=arity, checked=checked, parameters="".join(f", {name}" for name in names),
                 answer="_result = " if checked else "return ", values="".join(f"{name}, " for name in names),
                 tail=_CHECKED if checked else ""))

@@ -31,7 +31,7 @@ def client3_classes(companion_classes):
 
 @pytest.fixture(scope="module")
 def own_host(tmp_path_factory):
-    """An application of this file's own: the table of calls runs setters on it."""
+    """An application of this file's own: the table of calls runs setters on it, the path tests save."""
     started = hostproc.start(log_path=tmp_path_factory.mktemp("host") / "host.log")
     yield started
     started.stop()
@@ -173,9 +173,8 @@ def test_numeric_vector_fields_stay_buffers_of_their_record(client):
 # ---- Paths ---------------------------------------------------------------------------------------
 
 @pytest.mark.parametrize("convert", [str, os.fsencode, pathlib.Path], ids=["str", "bytes", "Path"])
-def test_file_commands_take_paths(tmp_path, convert, start_host):
-    host = start_host()
-    with Client3.connect(host.address, host.port) as client:
+def test_file_commands_take_paths(tmp_path, convert, own_host):
+    with Client3.connect(own_host.address, own_host.port) as client:
         path = tmp_path / "take.scene"
         assert client.SaveFile(convert(path), "")
         assert client.LoadFile(path=convert(path))
