@@ -18,7 +18,7 @@ ApplicationError: int
 InvalidFrameNumber: int
 ConversionError: int
 ExpectedOneFrame: int
-def ToString(code: int) -> str: ...
+def ToString(code: int, /) -> str: ...
 
 class Error(Exception):
     code: int

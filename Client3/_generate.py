@@ -145,7 +145,7 @@ ApplicationError: int
 InvalidFrameNumber: int
 ConversionError: int
 ExpectedOneFrame: int
-def ToString(code: int) -> str: ...
+def ToString(code: int, /) -> str: ...
 
 class Error(Exception):
     code: int
@@ -248,10 +248,10 @@ def answer_of_reader(name: str) -> str:
 
 # The functions of Client3._buffers; generate_buffers() fails when the module has others.
 BUFFERS = {
-    "view": "def view(v: Any) -> memoryview: ...",
-    "copy": "def copy(v: Any) -> Union[memoryview, List[str]]: ...",
+    "view": "def view(v: Any, /) -> memoryview: ...",
+    "copy": "def copy(v: Any, /) -> Union[memoryview, List[str]]: ...",
     "fill": "def fill(v: Any, buffer: Any) -> None: ...",
-    "exports": "def exports(v: Any) -> int: ...",
+    "exports": "def exports(v: Any, /) -> int: ...",
     "guard": "def guard(*vectors: Any) -> None: ...",
     "exporting": "def exporting() -> bool: ...",
 }
