@@ -161,10 +161,6 @@ def test_vectorss_elements_read_as_str():
     assert texts.pop(0) == "LANK" and texts.pop() == "C7" and texts == ["RANK"]
 
 
-def test_safe_string_stays_available():
-    assert str(Client3.SafeString("walk")) == "walk"
-
-
 def test_numeric_vector_fields_stay_buffers_of_their_record(client):
     trajectory = client.GetTrajectory("Alice", "LANK").check()
     assert isinstance(trajectory.X, Client3.vectord) and trajectory.X.view().format == "d"
