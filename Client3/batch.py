@@ -334,7 +334,7 @@ def main(argv: Optional[List[str]] = None) -> int:
     parser.add_argument("takes", metavar="TAKE", nargs="*", help="scene, CSV or C3D files")
     parser.add_argument("--workers", type=int, help="worker processes (default: the number of cores)")
     parser.add_argument("--cluster", metavar="ADDRESS", help="a Dask scheduler's address")
-    parser.add_argument("--out", metavar="FILE", help="append each result to FILE as a JSON line")
+    parser.add_argument("--out", metavar="FILE", help="write each result to FILE as a JSON line as its take ends; without --resume, FILE is started anew")
     parser.add_argument("--resume", action="store_true", help="skip the takes already in FILE")
     parser.add_argument("--retries", type=int, default=1, help="runs again after the application ended (default 1)")
     arguments = parser.parse_args(argv)

@@ -8,6 +8,7 @@ with the interpreter's own compiler settings, then prints one table: shape, ours
 figure is the best of several repeats, ours and the floor measured one after the other in each repeat.
 Calls are measured on bare proxies (the companion's classes are not registered); objects a call hands
 out owned are deleted in the same statement, and the floor calls a do-nothing function in their place.
+The last table sets Client3's methods against the flat calls they make, its classes registered.
 """
 import argparse
 import ctypes
@@ -79,9 +80,9 @@ def measure(rows, repeats):
             row.run_once()
 
 
-def import_self_times(modules, path, runs):
+def import_self_times(modules, path, runs, cumulative=False):
     """Best self time (microseconds) of `import module` in a fresh interpreter, from -X importtime, for
-    each module; the modules take turns."""
+    each module (with what it imports, when `cumulative`); the modules take turns."""
     best = dict.fromkeys(modules, float("inf"))
     env = dict(os.environ, PYTHONPATH=os.pathsep.join([path, os.environ.get("PYTHONPATH", "")]))
     for _ in range(runs):
@@ -89,9 +90,9 @@ def import_self_times(modules, path, runs):
             done = subprocess.run([sys.executable, "-X", "importtime", "-c", "import " + module],
                                   capture_output=True, text=True, env=env)
             for line in done.stderr.splitlines():
-                found = re.match(r"import time:\s+(\d+) \|\s+\d+ \|\s+%s$" % re.escape(module), line)
+                found = re.match(r"import time:\s+(\d+) \|\s+(\d+) \|\s+%s$" % re.escape(module), line)
                 if found:
-                    best[module] = min(best[module], int(found.group(1)))
+                    best[module] = min(best[module], int(found.group(2 if cumulative else 1)))
     return [best[module] for module in modules]
 
 
@@ -271,6 +272,34 @@ def round_trip_row(m, number):
     return row
 
 
+def companion_rows(m, number):
+    """Client3's methods against the flat call each makes (the floor column), on a client that was never
+    connected and on one connected to a host on loopback, by position and by keyword; Client3's classes
+    are registered for both. Measured last, since importing Client3 registers its classes."""
+    import Client3
+    from Client3.testing import running_host
+
+    host = running_host(scene="demo", log=False)
+    running = host.__enter__()
+    scope = dict(m=m, c=Client3.Client(), h=Client3.connect(running.address, running.port))
+    lines = [
+        ("Client3 GetFrameCount, unconnected", "c.GetFrameCount()", "m.ZarvoPelluxPostClient_GetFrameCount(c)"),
+        ("Client3 ParameterGet, unconnected, by position", "c.ParameterGet(1, 2, 3, 'x')",
+         "m.ZarvoPelluxPostClient_ParameterGet(c, 1, 2, 3, 'x')"),
+        ("Client3 ParameterGet, unconnected, by keyword", "c.ParameterGet(object=1, parameter=2, kind=3, field='x')",
+         "m.ZarvoPelluxPostClient_ParameterGet(c, 1, 2, 3, 'x')"),
+        ("Client3 ChannelSetValue, unconnected, by keyword",
+         "c.ChannelSetValue(object=1, channel=2, frame=3, component=4, interpolation=5, value='x', options='y')",
+         "m.ZarvoPelluxPostClient_ChannelSetValue(c, 1, 2, 3, 4, 5, 'x', 'y')"),
+        ("Client3 GetTrajectoryAtFrame, host, by position", "h.GetTrajectoryAtFrame('Alice', 'LANK', 5)",
+         "m.ZarvoPelluxPostClient_GetTrajectoryAtFrame(h, 'Alice', 'LANK', 5)"),
+        ("Client3 GetTrajectoryAtFrame, host, by keyword", "h.GetTrajectoryAtFrame(subject='Alice', marker='LANK', frame=5)",
+         "m.ZarvoPelluxPostClient_GetTrajectoryAtFrame(h, 'Alice', 'LANK', 5)"),
+    ]
+    rows = [Row(shape, ours, floor, scope, number // 20 if ", host," in shape else number) for shape, ours, floor in lines]
+    return rows, lambda: (scope["h"].Disconnect(), host.__exit__(None, None, None))
+
+
 # ---- The table ----------------------------------------------------------------------------------
 
 def print_table(title, lines):
@@ -318,7 +347,16 @@ def main(argv=None):
         trip = round_trip_row(m, 200 if options.quick else 5000)
         if trip is not None:
             lines.append((trip.shape, *trip.cells()))
+        package, = import_self_times(["Client3"], directory, runs, cumulative=True)
+        lines.append(("import Client3 (with what it imports)", "%d us" % package, "-", "-"))
         print_table("start-up, memory and the host", lines)
+
+        companion, stop = companion_rows(m, number)
+        try:
+            measure(companion, repeats)
+        finally:
+            stop()
+        print_table("the Client3 package (floor: the flat call it makes)", [(row.shape, *row.cells()) for row in companion])
     return 0
 
 

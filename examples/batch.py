@@ -53,8 +53,8 @@ def make_takes(folder: str) -> List[str]:
 def gaps(client: Client3.ZarvoPelluxPostClient) -> int:
     """Runs of unseen frames with seen frames on both sides, over every marker of every subject."""
     count = 0
-    for subject in map(str, client.GetSubjectNames().check().Names):
-        for marker in map(str, client.GetMarkerNames(subject).check().Names):
+    for subject in client.GetSubjectNames().check().Names:
+        for marker in client.GetMarkerNames(subject).check().Names:
             seen = "".join("1" if e else "0" for e in client.GetTrajectory(subject, marker).check().E)
             count += len([run for run in seen.strip("0").split("1") if run])
     return count
@@ -64,10 +64,10 @@ def process(client: Client3.ZarvoPelluxPostClient, take: str) -> Tuple[int, int]
     """The job: fills the gaps, then low-passes every marker at 6 Hz; (gaps before, gaps after)."""
     before = gaps(client)
     client.OfflineFixOcclusion("", "").check()
-    for subject in map(str, client.GetSubjectNames().check().Names):
-        for marker in map(str, client.GetMarkerNames(subject).check().Names):
+    for subject in client.GetSubjectNames().check().Names:
+        for marker in client.GetMarkerNames(subject).check().Names:
             node = client.SceneGetObject(f"/{subject}/{marker}").check().ID
-            x = int(str(client.ObjectGetChannel(node, "X").check().Str))
+            x = int(client.ObjectGetChannel(node, "X").check().Str)
             client.FilterApplyFIR(node, x, "XYZ", False, 31, 6.0, 0.0, 2.0).check()
     return before, gaps(client)
 

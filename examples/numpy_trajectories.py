@@ -21,19 +21,19 @@ def trajectories(client: Client3.ZarvoPelluxPostClient, subject: str) -> Dict[st
     """Each marker's positions (NaN where it was not seen) and its seen-mask."""
     arrays: Dict[str, Trajectory] = {}
     for marker in client.GetMarkerNames(subject).check().Names:
-        trajectory = client.GetTrajectory(subject, str(marker)).check()
+        trajectory = client.GetTrajectory(subject, marker).check()
         seen = np.array(list(trajectory.E), dtype=bool)
         positions = np.column_stack([np.array(list(axis), dtype=float) for axis in (trajectory.X, trajectory.Y, trajectory.Z)])
         positions[~seen] = np.nan
-        arrays[str(marker)] = (positions, seen)
+        arrays[marker] = (positions, seen)
     return arrays
 
 
 def report(client: Client3.ZarvoPelluxPostClient) -> None:
     for subject in client.GetSubjectNames().check().Names:
-        for marker, (positions, seen) in trajectories(client, str(subject)).items():
+        for marker, (positions, seen) in trajectories(client, subject).items():
             speed = np.nanmean(np.linalg.norm(np.diff(positions, axis=0), axis=1)) * 100.0  # mm a frame at 100 Hz
-            print(f"{subject!s:<6} {marker:<5} {int(seen.sum()):5d} frames seen, mean speed {speed / 1000:.2f} m/s")
+            print(f"{subject:<6} {marker:<5} {int(seen.sum()):5d} frames seen, mean speed {speed / 1000:.2f} m/s")
 
 
 def main(argv: list[str]) -> None:

@@ -26,7 +26,7 @@ def by_name(client: Client3.ZarvoPelluxPostClient) -> None:
 
     # A command with arguments, written as one line.
     line = client.PSL('GetSubjectParamDetails Subject=Alice Skeleton="" Parameter=Height').check()
-    print(str(line.Str), end="")
+    print(line.Str, end="")
 
 
 def main(argv: list[str]) -> None:

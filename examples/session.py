@@ -3,10 +3,12 @@ its motion smoothed, plotted before and after.
 
     python examples/session.py                  # starts its own application on a free port
     python examples/session.py HOST PORT        # uses a running one
-    python examples/session.py --plot out.png --subject Bob --marker LKNE
+    python examples/session.py --out plot.png --subject Bob --marker LKNE
 
-The plot (session.png by default) shows the marker's x, y and z over time with its gaps shaded, as
-captured and after OfflineFixOcclusion (gaps of up to one second) and FilterApplyFIR (6 Hz).
+The picture (--out, session.png in the current folder by default) has a row for each of the
+marker's x, y and z: on the left the whole take, captured samples and the gaps shaded; on the right
+a zoom on the longest gap, where the samples that OfflineFixOcclusion filled (gaps of up to one
+second) are drawn apart from the captured ones, with the curve after FilterApplyFIR (6 Hz).
 """
 from __future__ import annotations
 
@@ -23,8 +25,6 @@ import matplotlib.pyplot as plt  # noqa: E402
 
 import Client3  # noqa: E402
 from Client3.testing import running_host  # noqa: E402
-
-FRAME_RATE = 100.0  # frames per second of the demo scene; the application has no frame-rate command yet
 
 
 def gaps(seen: Sequence[bool]) -> List[Tuple[int, int]]:
@@ -53,19 +53,20 @@ def application(address: str, port: int) -> Iterator[Tuple[str, int]]:
 
 def account(client: Client3.ZarvoPelluxPostClient) -> None:
     info = client.PSL("GetServerInfo").check()
-    server = dict(line.split("=", 1) for line in str(info.Str).splitlines())
+    server = dict(line.split("=", 1) for line in info.Str.splitlines())
     print(f"{server['Program']} {server['MajorVersion']}.{server['MinorVersion']}.{server['PointVersion']}")
 
     frames = client.GetFrameCount()
     scene = client.GetSceneName().check()
-    print(f"scene '{scene.Name}', frames 1 to {frames} at {FRAME_RATE:g} Hz ({frames / FRAME_RATE:g} s)")
+    rate = client.TimelineGetFrameRate().check().Value
+    print(f"scene '{scene.Name}', frames 1 to {frames} at {rate:g} Hz ({frames / rate:g} s)")
 
     subjects = client.GetSubjectNames().check()
     for subject in subjects.Names:
         print(f"subject {subject}:")
-        for marker in client.GetMarkerNames(str(subject)).check().Names:
-            seen = list(client.GetTrajectory(str(subject), str(marker)).check().E)
-            print(f"  {marker!s:<6} seen in {sum(seen):5d} frames, {len(gaps(seen))} gap(s)")
+        for marker in client.GetMarkerNames(subject).check().Names:
+            seen = list(client.GetTrajectory(subject, marker).check().E)
+            print(f"  {marker:<6} seen in {sum(seen):5d} frames, {len(gaps(seen))} gap(s)")
 
 
 def tree(client: Client3.ZarvoPelluxPostClient) -> None:
@@ -76,35 +77,40 @@ def tree(client: Client3.ZarvoPelluxPostClient) -> None:
     for child, kind in zip(children.IDList, children.TypeList):
         path = client.ObjectGetPath(child).check().Str
         below = len(client.ObjectGetDescendants(child).check().IDList)
-        print(f"  {path!s:<10} {kind!s:<8} {below:3d} objects below")
+        print(f"  {path:<10} {kind:<8} {below:3d} objects below")
 
 
 def save_and_reload(client: Client3.ZarvoPelluxPostClient) -> None:
     """Saves the scene, replaces it with an empty one, and loads it back."""
-    before = [str(name) for name in client.GetSubjectNames().check().Names]
+    before = client.GetSubjectNames().check().Names
     with tempfile.TemporaryDirectory() as folder:
         path = os.path.join(folder, "demo.scene")
         client.SaveFile(path, "").check()
         client.NewScene().check()
         emptied = len(client.GetSubjectNames().check().Names)
         client.LoadFile(path).check()
-    after = [str(name) for name in client.GetSubjectNames().check().Names]
+    after = client.GetSubjectNames().check().Names
     print(f"saved, emptied ({emptied} subjects) and reloaded: subjects {', '.join(after)}"
           f"{'' if after == before else ' (changed!)'}")
 
 
-def draw(axes: Any, trajectory: Client3.Output_GetTrajectory, title: str) -> None:
-    """One marker's x, y and z over time, unseen frames left out and gaps shaded."""
-    seen = list(trajectory.E)
-    seconds = [index / FRAME_RATE for index in range(len(seen))]
-    for name, values in (("x", trajectory.X), ("y", trajectory.Y), ("z", trajectory.Z)):
-        shown = [value if visible else float("nan") for value, visible in zip(values, seen)]
-        axes.plot(seconds, shown, label=name)
-    for number, (first, last) in enumerate(gaps(seen)):
-        axes.axvspan((first - 1) / FRAME_RATE, last / FRAME_RATE, color="red", alpha=0.2, label="gap" if number == 0 else None)
-    axes.set_ylabel("position (mm)")
-    axes.set_title(title)
-    axes.legend(loc="upper left")
+def draw(axes: Any, seconds: Sequence[float], captured: Sequence[float], seen: Sequence[bool],
+         processed: Sequence[float], filled: Sequence[int]) -> None:
+    """One coordinate: the captured samples, the curve after processing, and the filled samples."""
+    nan = float("nan")
+    axes.plot(seconds, [value if visible else nan for value, visible in zip(captured, seen)],
+              color="tab:blue", linewidth=2.5, label="captured")
+    axes.plot(seconds, processed, color="black", linewidth=0.8, label="after fixing and filtering")
+    axes.plot([seconds[index] for index in filled], [processed[index] for index in filled], linestyle="none",
+              marker="o", markersize=3, color="tab:orange", label="filled")
+
+
+def window(values: Sequence[float], first: int, last: int) -> Tuple[float, float]:
+    """The range of the values from index first to last, with a little room."""
+    shown = [value for value in values[first : last + 1] if value == value]  # NaN is not equal to itself
+    low, high = min(shown), max(shown)
+    room = (high - low) * 0.1 or 1.0
+    return low - room, high + room
 
 
 def process(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str) -> None:
@@ -114,7 +120,7 @@ def process(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str) ->
     client.OfflineSetOcclusionFixingSettings(settings).check()
     client.OfflineFixOcclusion(subject, "").check()
     obj = client.SceneGetObject(f"/{subject}/{marker}").check().ID
-    x = int(str(client.ObjectGetChannel(obj, "X").check().Str))
+    x = int(client.ObjectGetChannel(obj, "X").check().Str)
     client.FilterApplyFIR(obj, x, "XYZ", False, 21, 6.0, 0.0, 4.0).check()
 
 
@@ -124,13 +130,33 @@ def plot(client: Client3.ZarvoPelluxPostClient, subject: str, marker: str, path:
     print(f"{subject}'s {marker} travels from x = {x[0]:.0f} mm to x = {x[-1]:.0f} mm")
     process(client, subject, marker)
     after = client.GetTrajectory(subject, marker).check()
-    filled = sum(1 for was, now in zip(before.E, after.E) if now and not was)
-    print(f"occlusion fixing and a 6 Hz low-pass: {filled} frames of {subject}'s {marker} filled")
+    seen = list(before.E)
+    filled = [index for index, (was, now) in enumerate(zip(seen, after.E)) if now and not was]
+    print(f"occlusion fixing and a 6 Hz low-pass: {len(filled)} frames of {subject}'s {marker} filled")
 
-    figure, (top, bottom) = plt.subplots(2, 1, figsize=(10, 7), sharex=True)
-    draw(top, before, f"{subject} {marker} as captured")
-    draw(bottom, after, f"{subject} {marker} after occlusion fixing and a 6 Hz low-pass")
-    bottom.set_xlabel("time (s)")
+    rate = client.TimelineGetFrameRate().check().Value
+    seconds = [index / rate for index in range(len(seen))]
+    runs = gaps(seen)
+    first, last = max(runs, key=lambda run: run[1] - run[0]) if runs else (1, len(seen))
+    margin = int(rate * 0.3)
+    start, end = max(first - 1 - margin, 0), min(last - 1 + margin, len(seen) - 1)
+    figure, rows = plt.subplots(3, 2, figsize=(12, 8), sharex="col", gridspec_kw={"width_ratios": (2, 1)})
+    for (whole, zoom), name, captured, processed in zip(
+            rows, "xyz", (before.X, before.Y, before.Z), (after.X, after.Y, after.Z)):
+        for axes in (whole, zoom):
+            draw(axes, seconds, list(captured), seen, list(processed), filled)
+            axes.grid(alpha=0.3)
+        for number, (gap_first, gap_last) in enumerate(runs):
+            whole.axvspan((gap_first - 1) / rate, gap_last / rate, color="red", alpha=0.15,
+                          label="gap" if number == 0 else None)
+        whole.set_ylabel(f"{name} (mm)")
+        zoom.set_xlim(seconds[start], seconds[end])
+        zoom.set_ylim(*window(list(processed), start, end))
+    rows[0][0].set_title(f"{subject} {marker}: the whole take")
+    rows[0][1].set_title("the longest gap")
+    rows[0][0].legend(loc="upper left", fontsize="small")
+    rows[-1][0].set_xlabel("time (s)")
+    rows[-1][1].set_xlabel("time (s)")
     figure.tight_layout()
     figure.savefig(path)
     plt.close(figure)
@@ -141,7 +167,7 @@ def main() -> None:
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("address", nargs="?", default="127.0.0.1")
     parser.add_argument("port", nargs="?", type=int, default=0, help="the application's port; none starts one")
-    parser.add_argument("--plot", default="session.png", help="where to write the plot (PNG)")
+    parser.add_argument("--out", default="session.png", help="where to write the picture (default: session.png here)")
     parser.add_argument("--subject", default="Alice")
     parser.add_argument("--marker", default="RWRA")
     options = parser.parse_args()
@@ -150,7 +176,7 @@ def main() -> None:
             account(client)
             tree(client)
             save_and_reload(client)
-            plot(client, options.subject, options.marker, options.plot)
+            plot(client, options.subject, options.marker, options.out)
 
 
 if __name__ == "__main__":

@@ -74,8 +74,14 @@ def test_different_kinds_do_not_relate(left, right):
             assert "std::invalid_argument" in repr(pytest.raises(RuntimeError, relation, a, b).value.args[0])
 
 
+def unowned(proxy):
+    """A proxy that lives to the interpreter's exit, disowned: its vector is not reported there as a leak."""
+    proxy.disown()
+    return proxy
+
+
 @pytest.mark.parametrize("operator", ["__eq__", "__ne__", "__add__", "__sub__"])
-@pytest.mark.parametrize("other", [3.5, "x", object(), m.new_vectord()])
+@pytest.mark.parametrize("other", [3.5, "x", object(), unowned(m.new_vectord())])
 def test_operators_answer_not_implemented(operator, other):
     iterator = m.vectord_begin(m.new_vectord([1.0]))
     assert getattr(m, "SwigPyIterator_" + operator)(iterator, other) is NotImplemented

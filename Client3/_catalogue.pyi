@@ -1,0 +1,5 @@
+from typing import Tuple
+
+_Parameters = Tuple[Tuple[str, str], ...]
+
+COMMANDS: Tuple[Tuple[str, str, _Parameters, _Parameters], ...]

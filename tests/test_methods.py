@@ -1,0 +1,313 @@
+"""The Client3 client as Python users meet it: methods named and ordered as the application's commands,
+keywords, text as str, paths, notes on refused arguments, clients that raise, records that are true
+when they succeeded, the version and the guide."""
+import inspect
+import os
+import pathlib
+import pydoc
+import subprocess
+import sys
+
+import pytest
+
+import _Client3
+import Client3
+import hostproc
+from Client3 import _catalogue
+from Client3.testing import running_host
+
+CLIENT = Client3.Client
+METHODS = Client3.TABLE["ZarvoPelluxPostClient"].methods
+# The library's operations that are not commands of the application, with their parameters.
+LIBRARY = {"Connect": ["address", "port"], "Disconnect": [], "IsConnected": [], "AllocSafeString": ["text"]}
+COMMANDS = {name: inputs for name, _, inputs, _ in _catalogue.COMMANDS}
+NOTES = sys.version_info >= (3, 11)
+
+
+@pytest.fixture(autouse=True)
+def client3_classes(companion_classes):
+    """Client3's classes for every test of this file."""
+
+
+@pytest.fixture(scope="module")
+def own_host(tmp_path_factory):
+    """An application of this file's own: the table of calls runs setters on it, the path tests save."""
+    started = hostproc.start(log_path=tmp_path_factory.mktemp("host") / "host.log")
+    yield started
+    started.stop()
+
+
+@pytest.fixture
+def client(host):
+    with Client3.connect(host.address, host.port) as connected:
+        yield connected
+
+
+def parameters(method):
+    return list(inspect.signature(getattr(CLIENT, method)).parameters)[1:]
+
+
+def catalogue_inputs(client, command):
+    """The command's inputs as the running application describes them (GetCommandInfo)."""
+    text = client.GetCommandInfo(command).check().DefaultOutputString()
+    block = text.split("Input Parameters\n", 1)[1].split("\n", 1)[1].split("-----", 1)[0]
+    names = [line.split()[0] for line in block.splitlines() if line.strip()]
+    return [] if names == ["None"] else names
+
+
+@pytest.mark.parametrize("name, spelled", [
+    ("Subject", "subject"), ("SelectedOnly", "selected_only"), ("KeepWorld", "keep_world"),
+    ("SampleRate", "sample_rate"), ("X", "x"), ("IDList", "id_list"), ("MinCamsToStartTrajectory", "min_cams_to_start_trajectory"),
+    ("Vector3D", "vector3_d"), ("Import", "import_"),
+])
+def test_catalogue_names_are_spelt_in_snake_case(name, spelled):
+    assert Client3.snake_case(name) == spelled
+
+
+@pytest.mark.parametrize("method", METHODS)
+def test_signature_is_the_commands_inputs_in_order(client, method):
+    if method in LIBRARY:
+        expected = LIBRARY[method]
+    elif method.startswith("OfflineSet") and method.endswith("Settings"):
+        expected = ["settings"]
+    else:
+        expected = [Client3.snake_case(name) for name in catalogue_inputs(client, method)]
+    assert parameters(method) == expected
+    assert parameters(method) == list(inspect.signature(getattr(Client3.RaisingClient, method)).parameters)[1:]
+
+
+DESCRIPTIONS = {name: description for name, description, _, _ in _catalogue.COMMANDS}
+
+
+@pytest.mark.parametrize("method, says", [
+    ("GetTrajectory", "Answers Output_GetTrajectory with X (vectord), Y (vectord), Z (vectord), E (vectorb)."),
+    ("FilterApplyFIR", "Takes object (int), channel (int), component (str), selected_only (bool), taps (int)"),
+    ("OfflineSetSolvingSettings", "Takes settings (the Output_SolvingSettings that OfflineGetSolvingSettings answers"),
+    ("LoadFile", "Takes path (str, bytes or os.PathLike)."),
+    ("Connect", "Connects to the application at `address`"),
+])
+def test_help_shows_the_parameters_and_a_doc(method, says):
+    shown = pydoc.render_doc(getattr(CLIENT, method), renderer=pydoc.plaintext)
+    assert f"{method}(self,{','.join(parameters(method))})" in "".join(shown.split())  # however pydoc breaks it
+    assert DESCRIPTIONS.get(method, "") in " ".join(shown.split()) and says in " ".join(shown.split())
+
+
+def sample(client, method, parameter, kind):
+    """An argument of the command's wire type that the application refuses or can take twice alike; a
+    text names its parameter, so that arguments given in the wrong places show in the answer."""
+    if method.startswith("OfflineSet"):
+        return getattr(client, method.replace("OfflineSet", "OfflineGet"))().check()
+    if method == "ProcessRequest" and parameter == "parameters":
+        return client.GetCommandInfo("GetMarkerNames").check().InputParameters
+    return {"String": f"/nowhere/{parameter}", "Int": 3, "UInt": 3, "ULong": 2**40, "Bool": True, "Float": 0.5,
+            "Double": 0.5, "Doubles": [0.5], "Bools": [True]}[kind]
+
+
+def answer(value):
+    """What a call answered, comparable between calls: a record's fields, a parameter list by type."""
+    if isinstance(value, Client3.Output_Result):
+        fields = [getattr(value, field) for field in value._fields]
+        return type(value).__name__, [type(f).__name__ if isinstance(f, Client3.ParameterVector) else f for f in fields]
+    return str(value) if isinstance(value, Client3.SafeString) else value
+
+
+CALLED = [method for method in METHODS if parameters(method) and method != "Connect"]
+
+
+@pytest.mark.parametrize("method", CALLED)
+def test_keywords_and_positions_make_the_same_call(own_host, method):
+    with Client3.connect(own_host.address, own_host.port) as client:
+        kinds = [kind for _, kind in COMMANDS.get(method, [("", "String")] * len(parameters(method)))]
+        values = [sample(client, method, name, kind) for name, kind in zip(parameters(method), kinds)]
+        flat = getattr(_Client3, "ZarvoPelluxPostClient_" + method)(client, *values)
+        by_keyword = getattr(client, method)(**dict(zip(parameters(method), values)))
+        by_position = getattr(client, method)(*values)
+        assert answer(by_keyword) == answer(flat) == answer(by_position)
+
+
+# ---- Text ----------------------------------------------------------------------------------------
+
+def test_text_fields_read_as_str_and_lists_of_text_as_lists_of_str(client):
+    subjects = client.GetSubjectNames().check()
+    assert subjects.Names == ["Alice", "Bob"]
+    assert sorted(subjects.Names, reverse=True) == ["Bob", "Alice"]
+    name = client.GetSceneName().check().Name
+    assert type(name) is str and name + ".scene" == "Demo.scene"
+    assert type(client.GetCommandInfo("Log").check().Description) is str
+
+
+def test_a_list_of_text_is_a_copy_and_assigning_one_changes_the_record(client):
+    subjects = client.GetSubjectNames().check()
+    subjects.Names.append("Carol")
+    assert subjects.Names == ["Alice", "Bob"]
+    subjects.Names = ["Carol"]
+    assert subjects.Names == ["Carol"]
+
+
+@pytest.mark.parametrize("value, read", [("walk", "walk"), (b"run", "run"), (b"caf\xe9", "caf\udce9"), ("d\u00e9j\u00e0", "d\u00e9j\u00e0")])
+def test_text_assigned_to_a_field_reads_back_as_str(value, read):
+    parameter = Client3.Type_Parameter()
+    parameter.Value = value
+    assert parameter.Value == read and type(parameter.Value) is str
+
+
+def test_vectorss_elements_read_as_str():
+    texts = Client3.vectorss(["LANK", "RANK", "C7"])
+    read = [texts[0], texts[-1], texts.front(), texts.back(), *texts]
+    assert read == ["LANK", "C7", "LANK", "C7", "LANK", "RANK", "C7"]
+    assert {type(text) for text in read} == {str}
+    assert type(texts[1:]) is Client3.vectorss
+    assert list(reversed(texts)) == ["C7", "RANK", "LANK"]
+    assert texts.pop(0) == "LANK" and texts.pop() == "C7" and texts == ["RANK"]
+
+
+def test_numeric_vector_fields_stay_buffers_of_their_record(client):
+    trajectory = client.GetTrajectory("Alice", "LANK").check()
+    assert isinstance(trajectory.X, Client3.vectord) and trajectory.X.view().format == "d"
+
+
+# ---- Paths ---------------------------------------------------------------------------------------
+
+@pytest.mark.parametrize("convert", [str, os.fsencode, pathlib.Path], ids=["str", "bytes", "Path"])
+def test_file_commands_take_paths(tmp_path, convert, own_host):
+    with Client3.connect(own_host.address, own_host.port) as client:
+        path = tmp_path / "take.scene"
+        assert client.SaveFile(convert(path), "")
+        assert client.LoadFile(path=convert(path))
+        assert client.DatabaseCreate(convert(tmp_path), "db")
+        assert client.DatabaseSetCurrent("Database", convert(tmp_path / "db"))
+    assert path.exists()
+
+
+def test_a_path_where_a_path_is_not_taken_is_refused(client):
+    with pytest.raises(TypeError, match="Expected string type"):
+        client.SceneGetObject(pathlib.PurePosixPath("/Alice"))
+
+
+# ---- Notes on refused arguments ------------------------------------------------------------------
+
+@pytest.mark.parametrize("call, error, message, note", [
+    (lambda c: c.GetTrajectory(7, "LANK"), TypeError, "Expected string type",
+     "ZarvoPelluxPostClient.GetTrajectory(subject, marker): parameter 'subject' was given int 7"),
+    (lambda c: c.GetTrajectory("Alice", marker=None), TypeError, "Expected string type",
+     "ZarvoPelluxPostClient.GetTrajectory(subject, marker): parameter 'marker' was given NoneType None"),
+    (lambda c: c.ObjectGetParameter(1, "x", "p"), TypeError,
+     "in method 'ZarvoPelluxPostClient_ObjectGetParameter', argument 3 of type 'int'",
+     "ZarvoPelluxPostClient.ObjectGetParameter(object, kind, parameter): parameter 'kind' was given str 'x'"),
+    (lambda c: c.TimelineSetFrames(frame=2**40), OverflowError,
+     "in method 'ZarvoPelluxPostClient_TimelineSetFrames', argument 2 of type 'int'",
+     "ZarvoPelluxPostClient.TimelineSetFrames(frame): parameter 'frame' was given int 1099511627776"),
+    (lambda c: c.SetTrajectory("Alice", "LANK", [0.0], ["x"], [0.0], [True]), TypeError,
+     "in method 'ZarvoPelluxPostClient_SetTrajectory', argument 5 of type 'std::vector< double,std::allocator< double > > const &'",
+     "ZarvoPelluxPostClient.SetTrajectory(subject, marker, x, y, z, e): parameter 'y' was given list ['x']"),
+    (lambda c: c.LoadFile(3.5), TypeError, "Expected string type",
+     "ZarvoPelluxPostClient.LoadFile(path): parameter 'path' was given float 3.5"),
+    (lambda c: c.OfflineSetSolvingSettings(c.OfflineGetCircleFitSettings()), TypeError,
+     "in method 'ZarvoPelluxPostClient_OfflineSetSolvingSettings', argument 2 of type 'ZarvoSDKClientCPP::Output_SolvingSettings const &'",
+     "ZarvoPelluxPostClient.OfflineSetSolvingSettings(settings): parameter 'settings' was given Output_CircleFitSettings "),
+    (lambda c: Client3.vectord().append("x"), TypeError, None, "vectord.append(value): parameter 'value' was given str 'x'"),
+])
+def test_a_refused_argument_keeps_its_error_and_gains_a_note(call, error, message, note):
+    unconnected = Client3.Client()
+    with pytest.raises(error) as caught:
+        call(unconnected)
+    assert type(caught.value) is error
+    if NOTES:
+        assert message is None or str(caught.value) == message
+        assert len(caught.value.__notes__) == 1 and caught.value.__notes__[0].startswith(note)
+    else:
+        assert str(caught.value).startswith(f"{message}\n" if message else "") and note in str(caught.value)
+        assert type(caught.value.__cause__) is error
+
+
+def test_a_raising_client_notes_refused_arguments_too():
+    with pytest.raises(TypeError) as caught:
+        Client3.RaisingClient().GetMarkerNames(subject=1)
+    assert "RaisingClient.GetMarkerNames(subject): parameter 'subject' was given int 1" in (
+        "".join(getattr(caught.value, "__notes__", [])) + str(caught.value))
+
+
+def test_missing_and_unknown_keywords_are_the_interpreters_errors():
+    client = Client3.Client()
+    with pytest.raises(TypeError, match="missing 1 required positional argument: 'marker'"):
+        client.GetTrajectory(subject="Alice")
+    with pytest.raises(TypeError, match="unexpected keyword argument 'Subject'"):
+        client.GetTrajectory(Subject="Alice", marker="LANK")
+
+
+# ---- Failures: records, Client3.Error and clients that raise -------------------------------------
+
+def test_a_record_is_true_when_it_succeeded(client):
+    good, bad = client.GetMarkerNames("Alice"), client.GetMarkerNames("Carol")
+    assert (bool(good), good.ok) == (True, True)
+    assert (bool(bad), bad.ok) == (False, False)
+    assert not Client3.Client().GetFrameCount() and not Client3.Client().GetSubjectNames()
+
+
+def test_check_raises_the_records_code_and_text(client):
+    with pytest.raises(Client3.Error) as caught:
+        client.GetMarkerNames("Carol").check()
+    error = caught.value
+    assert (error.code, error.text, error.command) == (Client3.ApplicationError, "no subject named 'Carol'", None)
+    assert str(error) == "no subject named 'Carol' (result code 1003)"
+
+
+@pytest.mark.parametrize("call, code, text, command", [
+    (lambda c: c.GetMarkerNames("Carol"), Client3.ApplicationError, "no subject named 'Carol'", "GetMarkerNames"),
+    (lambda c: c.OfflineFixOcclusion(subject="Carol", options=""), Client3.ApplicationError, "no subject named 'Carol'",
+     "OfflineFixOcclusion"),
+    (lambda c: c.SetSceneName(""), Client3.ApplicationError, Client3.ToString(Client3.ApplicationError), "SetSceneName"),
+])
+def test_a_raising_client_raises_every_failure(host, call, code, text, command):
+    with Client3.connect(host.address, host.port, raise_errors=True) as client:
+        assert isinstance(client, Client3.RaisingClient)
+        assert client.GetMarkerNames("Alice").Names[:2] == ["LFHD", "RFHD"]
+        assert client.GetFrameCount() == 1000
+        with pytest.raises(Client3.Error) as caught:
+            call(client)
+    assert (caught.value.code, caught.value.text, caught.value.command) == (code, text, command)
+    assert str(caught.value) == f"{command}: {text} (result code {code})"
+
+
+@pytest.mark.parametrize("call, command", [
+    (lambda c: c.GetSubjectNames(), "GetSubjectNames"),
+    (lambda c: c.GetFrameCount(), "GetFrameCount"),
+    (lambda c: c.SetSceneName("Demo"), "SetSceneName"),
+])
+def test_a_raising_client_without_a_connection_raises_not_connected(call, command):
+    with pytest.raises(Client3.Error) as caught:
+        call(Client3.RaisingClient())
+    assert (caught.value.code, caught.value.command) == (Client3.NotConnected, command)
+
+
+def test_connect_raises_with_the_command():
+    with running_host(log=False) as gone:
+        pass
+    with pytest.raises(Client3.Error) as caught:
+        Client3.connect(gone.address, gone.port, raise_errors=True)
+    assert (caught.value.code, caught.value.command) == (Client3.NotConnected, "Connect")
+
+
+# ---- The package ---------------------------------------------------------------------------------
+
+def test_version_comes_from_the_package_metadata():
+    from importlib.metadata import version
+
+    assert Client3.__version__ == version("client3")
+    done = subprocess.run([sys.executable, "-m", "Client3", "--version"], capture_output=True, text=True, timeout=60)
+    assert (done.returncode, done.stdout) == (0, f"Client3 {version('client3')}\n")
+
+
+def test_help_is_a_guide_that_lists_every_method():
+    done = subprocess.run([sys.executable, "-c", "import Client3; help(Client3)"], capture_output=True, text=True,
+                          timeout=60, env=dict(os.environ, PAGER="cat"))
+    shown = done.stdout
+    assert done.returncode == 0 and len(shown.splitlines()) < 400
+    assert shown.index("The client") < shown.index("Records") < shown.index("Vectors") < shown.index("Batch")
+    assert all(method in shown for method in METHODS)
+
+
+def test_record_docs_list_their_fields_with_types():
+    doc = inspect.getdoc(Client3.Output_GetSubjectNames)
+    assert "Names (list[str]), Models (list[str]), Active (vectorb)" in doc
+    assert "GetSubjectNames" in doc
