@@ -19,7 +19,7 @@ import pickle
 import sys
 from typing import Any, Dict, Iterator, List, Optional, Sequence, Tuple
 
-import cloudpickle
+import cloudpickle  # type: ignore[import-untyped]  # it ships no type information
 import distributed
 from distributed.core import Status
 from distributed.diagnostics.plugin import WorkerPlugin
@@ -42,11 +42,18 @@ class Applications(WorkerPlugin):
 # --- on the workers -----------------------------------------------------------------------------
 
 
-@functools.lru_cache(maxsize=4)
+_jobs: Dict[bytes, batch.Job] = {}
+
+
 def _job(payload: bytes) -> batch.Job:
     """The job a batch sent, loaded once per worker process (its modules sent by value then keep their
-    state from take to take, as imported ones do)."""
-    return pickle.loads(payload)  # type: ignore[no-any-return]
+    state from take to take, as imported ones do); the jobs of the last few batches are kept."""
+    job = _jobs.get(payload)
+    if job is None:
+        if len(_jobs) >= 4:
+            _jobs.clear()
+        job = _jobs[payload] = pickle.loads(payload)
+    return job
 
 
 def _task(take: str, path: str, plan: Tuple[bytes, int, Tuple[str, ...]]) -> batch.Result:
