@@ -20,9 +20,6 @@ constexpr std::size_t kBlock = 512;
 constexpr std::uint8_t kKey = 0x50;
 constexpr std::size_t kMaxFrames = 1'000'000;
 
-// The processor types, as the parameter section's fourth byte names them.
-enum class Form : std::uint8_t { Intel = 84, Dec = 85, Mips = 86 };
-
 [[noreturn]] void Damaged(const std::string& why) { Refuse("the C3D file is damaged: " + why); }
 
 // `text` when it is printable ASCII, else a description that holds none of its bytes.
@@ -107,7 +104,7 @@ Header ReadHeader(std::string_view file, Form form) {
 // the section, makes its item the last.
 class Parameters {
  public:
-  Parameters(std::string_view file, std::size_t begin, std::size_t end, Form form) : file_(file), form_(form) {
+  Parameters(std::string_view file, std::size_t begin, std::size_t end, Form form) : form_(form) {
     for (std::size_t at = begin; at + 2 <= end;) {
       auto length = static_cast<std::int8_t>(file[at]);
       auto id = static_cast<std::int8_t>(file[at + 1]);
@@ -146,11 +143,9 @@ class Parameters {
  private:
   // Names are upper-cased; a name that is not printable text is damage, not a name.
   static std::string Name(std::string_view bytes) {
+    if (!ValidName(bytes)) Damaged("an item of its parameter section has a name that is not printable text");
     std::string name;
-    for (char c : bytes) {
-      if (c < 0x20 || c > 0x7e) Damaged("an item of its parameter section has a name that is not printable text");
-      name += static_cast<char>(c >= 'a' && c <= 'z' ? c - 'a' + 'A' : c);
-    }
+    for (char c : bytes) name += static_cast<char>(c >= 'a' && c <= 'z' ? c - 'a' + 'A' : c);
     return name;
   }
 
@@ -193,7 +188,6 @@ class Parameters {
     return out;
   }
 
-  std::string_view file_;
   Form form_;
   std::map<int, Group> groups_;
 };
@@ -341,7 +335,7 @@ std::size_t FrameCount(std::string_view file, const Header& h, const Parameters&
   auto count = static_cast<std::size_t>(wanted);
   std::size_t held = l.frameBytes == 0 ? count : l.start > file.size() ? 0 : (file.size() - l.start) / l.frameBytes;
   if (held >= count) return count;
-  if (held + 1 == count && static_cast<double>(held) == header) {
+  if (held > 0 && held + 1 == count && static_cast<double>(held) == header) {
     notes.push_back("it gives " + std::to_string(count) + " frames and its data hold " + std::to_string(held) + ": " +
                     std::to_string(held) + " frames were read");
     return held;
@@ -370,27 +364,14 @@ void ReadPoints(std::string_view file, const Layout& l, double factor, Take& tak
   }
 }
 
-template <Form F, bool Floats>
-void ReadAnalog(std::string_view file, const Layout& l, Take& take) {
-  std::size_t words = l.channels * l.samplesPerFrame;
-  for (std::size_t f = 0; f < take.frames; ++f) {
-    const char* row = file.data() + l.start + f * l.frameBytes + l.points * 4 * l.Word();
-    for (std::size_t i = 0; i < words; ++i) {
-      const char* at = row + i * l.Word();
-      std::uint16_t word = Floats ? 0 : Load16(at, F == Form::Mips);
-      float value = Floats ? Real<F>(at) : l.unsignedAnalog ? word : static_cast<std::int16_t>(word);
-      take.analog[i % l.channels].samples[f * l.samplesPerFrame + i / l.channels] = value;
-    }
-  }
-}
-
 template <Form F>
-void ReadData(std::string_view file, const Layout& l, double factor, Take& take) {
-  if (l.floats) ReadPoints<F, true>(file, l, factor, take), ReadAnalog<F, true>(file, l, take);
-  else ReadPoints<F, false>(file, l, factor, take), ReadAnalog<F, false>(file, l, take);
+void ReadPoints(std::string_view file, const Layout& l, double factor, Take& take) {
+  if (l.floats) ReadPoints<F, true>(file, l, factor, take);
+  else ReadPoints<F, false>(file, l, factor, take);
 }
 
-void ReadAnalogDescriptions(const Parameters& ps, const Layout& l, Take& take) {
+// The analog channels' descriptions; their samples stay in the file's bytes.
+void ReadAnalog(std::shared_ptr<const std::string> file, const Parameters& ps, const Layout& l, Take& take) {
   std::size_t n = l.channels;
   std::vector<std::string> labels = TextSeries(ps, "ANALOG", "LABELS", n), descriptions = TextSeries(ps, "ANALOG", "DESCRIPTIONS", n),
                            units = TextSeries(ps, "ANALOG", "UNITS", n);
@@ -401,15 +382,25 @@ void ReadAnalogDescriptions(const Parameters& ps, const Layout& l, Take& take) {
     Analog& a = take.analog[c];
     a.label = labels[c], a.description = descriptions[c], a.unit = units[c];
     a.scale = std::isfinite(scales[c]) ? scales[c] : 1, a.offset = std::isfinite(offsets[c]) ? offsets[c] : 0;
-    a.samples.assign(take.frames * l.samplesPerFrame, 0.0f);
+    a.column = c;
   }
   std::optional<double> general = Number(ps.Find("ANALOG", "GEN_SCALE"));
   take.generalScale = general ? *general : 1;
+  using Kind = AnalogData::Kind;
+  Kind kind = l.floats ? Kind::Float : l.unsignedAnalog ? Kind::Unsigned16 : Kind::Signed16;
+  if (n > 0)
+    take.samples = AnalogData(std::move(file), {l.start + l.points * 4 * l.Word(), l.frameBytes, n, l.samplesPerFrame, take.frames, l.form, kind});
 }
 
 }  // namespace
 
-Take Read(std::string_view file) {
+bool ValidName(std::string_view name) {
+  return !name.empty() && name.size() <= 127 && std::all_of(name.begin(), name.end(), [](char c) { return c >= 0x20 && c <= 0x7e; });
+}
+
+Take Read(std::string bytes) {
+  auto owned = std::make_shared<const std::string>(std::move(bytes));
+  std::string_view file = *owned;
   if (file.size() < kBlock || static_cast<std::uint8_t>(file[1]) != kKey) Damaged("it does not start with a C3D header");
   std::size_t block = static_cast<std::uint8_t>(file[0]);
   if (block < 2) Damaged("its parameters start in block " + std::to_string(block));
@@ -439,13 +430,84 @@ Take Read(std::string_view file) {
     for (auto& axis : take.points[p].axis) axis.assign(take.frames, 0.0);
     take.points[p].seen.assign(take.frames, false);
   }
-  take.samplesPerFrame = l.samplesPerFrame;
-  ReadAnalogDescriptions(ps, l, take);
-  if (form == Form::Intel) ReadData<Form::Intel>(file, l, factor, take);
-  else if (form == Form::Dec) ReadData<Form::Dec>(file, l, factor, take);
-  else ReadData<Form::Mips>(file, l, factor, take);
+  if (form == Form::Intel) ReadPoints<Form::Intel>(file, l, factor, take);
+  else if (form == Form::Dec) ReadPoints<Form::Dec>(file, l, factor, take);
+  else ReadPoints<Form::Mips>(file, l, factor, take);
+  ReadAnalog(std::move(owned), ps, l, take);
   take.groups = ps.Others();
   return take;
+}
+
+// ---- Analog samples --------------------------------------------------------------------------------
+
+namespace {
+
+// One sample of form F and kind K.
+template <Form F, AnalogData::Kind K>
+struct Sample {
+  float operator()(const char* at) const {
+    if constexpr (K == AnalogData::Kind::Float) return Real<F>(at);
+    else if constexpr (K == AnalogData::Kind::Unsigned16) return Load16(at, F == Form::Mips);
+    else return static_cast<std::int16_t>(Load16(at, F == Form::Mips));
+  }
+};
+
+// use(Sample<F, K>{}) for the layout's form and kind, so that each loop is made for its own.
+template <Form F, class Use>
+decltype(auto) ByKind(AnalogData::Kind kind, Use&& use) {
+  using K = AnalogData::Kind;
+  if (kind == K::Float) return use(Sample<F, K::Float>{});
+  if (kind == K::Unsigned16) return use(Sample<F, K::Unsigned16>{});
+  return use(Sample<F, K::Signed16>{});
+}
+
+template <class Use>
+decltype(auto) BySample(const AnalogData::Layout& l, Use&& use) {
+  if (l.form == Form::Dec) return ByKind<Form::Dec>(l.kind, use);
+  if (l.form == Form::Mips) return ByKind<Form::Mips>(l.kind, use);
+  return ByKind<Form::Intel>(l.kind, use);
+}
+
+std::size_t WordOf(const AnalogData::Layout& l) { return l.kind == AnalogData::Kind::Float ? 4 : 2; }
+
+}  // namespace
+
+AnalogData AnalogData::FromChannels(const std::vector<std::vector<float>>& channels, std::size_t samplesPerFrame, std::size_t frames) {
+  std::size_t n = channels.size();
+  std::string bytes(frames * samplesPerFrame * n * 4, '\0');
+  for (std::size_t c = 0; c < n; ++c)
+    for (std::size_t i = 0; i < frames * samplesPerFrame; ++i) Store32(&bytes[(i * n + c) * 4], std::bit_cast<std::uint32_t>(channels[c][i]));
+  Layout layout{0, samplesPerFrame * n * 4, n, samplesPerFrame, frames, Form::Intel, Kind::Float};
+  return AnalogData(std::make_shared<const std::string>(std::move(bytes)), layout);
+}
+
+std::vector<float> AnalogData::Channel(std::size_t column) const {
+  std::vector<float> out;
+  out.reserve(layout_.frames * layout_.samplesPerFrame);
+  std::size_t step = layout_.channels * WordOf(layout_);
+  BySample(layout_, [&](auto sample) {
+    for (std::size_t f = 0; f < layout_.frames; ++f) {
+      const char* at = bytes_->data() + layout_.start + f * layout_.stride + column * WordOf(layout_);
+      for (std::size_t s = 0; s < layout_.samplesPerFrame; ++s, at += step) out.push_back(sample(at));
+    }
+  });
+  return out;
+}
+
+char* AnalogData::WriteFrame(std::size_t frame, const std::vector<std::size_t>& columns, char* out) const {
+  const char* row = bytes_->data() + layout_.start + frame * layout_.stride;
+  bool all = columns.size() == layout_.channels;
+  for (std::size_t c = 0; all && c < columns.size(); ++c) all = columns[c] == c;
+  if (all && layout_.form == Form::Intel && layout_.kind == Kind::Float) {  // already what is written
+    std::memcpy(out, row, layout_.channels * layout_.samplesPerFrame * 4);
+    return out + layout_.channels * layout_.samplesPerFrame * 4;
+  }
+  std::size_t word = WordOf(layout_);
+  return BySample(layout_, [&](auto sample) {
+    for (std::size_t s = 0; s < layout_.samplesPerFrame; ++s, row += layout_.channels * word)
+      for (std::size_t c : columns) Store32(out, std::bit_cast<std::uint32_t>(sample(row + c * word))), out += 4;
+    return out;
+  });
 }
 
 // ---- Writing -------------------------------------------------------------------------------------
@@ -553,7 +615,7 @@ void AnalogGroup(ParameterWriter& p, const Take& take) {
   }
   p.Group(kAnalog, "ANALOG");
   p.Word(kAnalog, "USED", static_cast<std::uint16_t>(take.analog.size()));
-  p.Float(kAnalog, "RATE", static_cast<float>(take.rate * static_cast<double>(take.samplesPerFrame)));
+  p.Float(kAnalog, "RATE", static_cast<float>(take.rate * static_cast<double>(take.samples.samplesPerFrame())));
   p.Float(kAnalog, "GEN_SCALE", static_cast<float>(take.generalScale));
   if (take.analog.empty()) return;
   p.Floats(kAnalog, "SCALE", scales);
@@ -602,17 +664,23 @@ std::string Shortest(double value) {
 
 void CheckWritable(const Take& take) {
   if (take.points.size() > 65535) Refuse("too many markers for a C3D file");
-  if (take.analog.size() > 32767 || take.analog.size() * take.samplesPerFrame > 65535 || take.samplesPerFrame > 65535)
+  std::size_t perFrame = take.samples.samplesPerFrame();
+  if (take.analog.size() > 32767 || take.analog.size() * perFrame > 65535 || perFrame > 65535)
     Refuse("too many analog samples per frame for a C3D file");
   for (const Point& point : take.points)
     if (point.label.size() > 255) Refuse("the label '" + point.label + "' is longer than a C3D file allows");
-  for (const Analog& a : take.analog)
+  for (const Analog& a : take.analog) {
     if (a.label.size() > 255 || a.description.size() > 255 || a.unit.size() > 255)
       Refuse("the analog channel '" + a.label + "' has a text longer than a C3D file allows");
+    if (a.column >= take.samples.channels() || take.samples.frames() != take.frames)
+      Refuse("the analog channel '" + a.label + "' does not have its samples for every frame");
+  }
 }
 
 // Frame by frame: x, y, z and 0 (seen) or 0, 0, 0 and -1 (not seen) per point, then the analog samples.
 void WriteFrames(const Take& take, char* out) {
+  std::vector<std::size_t> columns;
+  for (const Analog& a : take.analog) columns.push_back(a.column);
   for (std::size_t f = 0; f < take.frames; ++f) {
     for (const Point& point : take.points) {
       bool seen = point.seen[f];
@@ -624,8 +692,7 @@ void WriteFrames(const Take& take, char* out) {
       }
       Store32(out, std::bit_cast<std::uint32_t>(seen ? 0.0f : -1.0f)), out += 4;
     }
-    for (std::size_t s = 0; s < take.samplesPerFrame; ++s)
-      for (const Analog& a : take.analog) Store32(out, std::bit_cast<std::uint32_t>(a.samples[f * take.samplesPerFrame + s])), out += 4;
+    if (!columns.empty()) out = take.samples.WriteFrame(f, columns, out);
   }
 }
 
@@ -637,7 +704,7 @@ std::string Write(const Take& take) {
   std::string section = ParameterSection(take, 0);
   auto dataBlock = static_cast<std::uint16_t>(2 + section.size() / kBlock);
   section = ParameterSection(take, dataBlock);  // the same size: only a number changed
-  std::size_t analogWords = take.analog.size() * take.samplesPerFrame;
+  std::size_t analogWords = take.analog.size() * take.samples.samplesPerFrame();
 
   std::string out{'\x02', static_cast<char>(kKey)};
   Store16(out, static_cast<std::uint16_t>(take.points.size()));
@@ -647,7 +714,7 @@ std::string Write(const Take& take) {
   Store16(out, 0);  // largest gap filled
   StoreFloat(out, -1.0f);  // scale: negative for float data
   Store16(out, dataBlock);
-  Store16(out, static_cast<std::uint16_t>(take.samplesPerFrame));
+  Store16(out, static_cast<std::uint16_t>(take.samples.samplesPerFrame()));
   StoreFloat(out, static_cast<float>(take.rate));
   out.resize(kBlock, '\0');
   out += section;

@@ -11,6 +11,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -39,19 +40,54 @@ struct Point {
   std::vector<bool> seen;
 };
 
-// One analog channel. Its physical values are (sample - offset) x scale x the take's general scale;
-// samples are kept as the file's numbers (16-bit integers and floats are exact in a float).
+// The processor forms, as a parameter section's fourth byte names them.
+enum class Form : std::uint8_t { Intel = 84, Dec = 85, Mips = 86 };
+
+// The analog samples of a take as the file holds them, kept in its bytes and read when they are
+// written out: frame after frame, `stride` bytes apart from `start`, each frame holding
+// samplesPerFrame rounds of one sample of every channel in turn. A sample is a 16-bit integer (signed
+// or not) or a float of the file's form, each exact in a float. Nothing changes them once read, so
+// a take and its copies share them.
+class AnalogData {
+ public:
+  enum class Kind : std::uint8_t { Signed16, Unsigned16, Float };
+  struct Layout {
+    std::size_t start = 0, stride = 0, channels = 0, samplesPerFrame = 0, frames = 0;
+    Form form = Form::Intel;
+    Kind kind = Kind::Float;
+  };
+  AnalogData() = default;
+  AnalogData(std::shared_ptr<const std::string> bytes, Layout layout) : bytes_(std::move(bytes)), layout_(layout) {}
+  // Float samples in the Intel form, from each channel's samples (samplesPerFrame x frames each).
+  static AnalogData FromChannels(const std::vector<std::vector<float>>& channels, std::size_t samplesPerFrame, std::size_t frames);
+
+  std::size_t channels() const { return layout_.channels; }
+  std::size_t samplesPerFrame() const { return layout_.samplesPerFrame; }
+  std::size_t frames() const { return layout_.frames; }
+  // The samples of channel `column`, frame by frame.
+  std::vector<float> Channel(std::size_t column) const;
+  // Writes frame `frame`'s samples of the channels `columns`, in that order, as Intel floats at
+  // `out`; returns the end of what it wrote.
+  char* WriteFrame(std::size_t frame, const std::vector<std::size_t>& columns, char* out) const;
+
+ private:
+  std::shared_ptr<const std::string> bytes_;
+  Layout layout_;
+};
+
+// One analog channel: its samples are column `column` of the take's AnalogData, and their physical
+// values (sample - offset) x scale x the take's general scale.
 struct Analog {
   std::string label, description, unit;  // label empty where the file gives none
   double scale = 1, offset = 0;
-  std::vector<float> samples;  // samplesPerFrame for each frame, frame by frame
+  std::size_t column = 0;
 };
 
 struct Take {
   double rate = 0;  // frames per second
   std::size_t frames = 0;
   std::vector<Point> points;
-  std::size_t samplesPerFrame = 0;  // analog samples of each channel per frame
+  AnalogData samples;
   double generalScale = 1;
   std::vector<Analog> analog;
   std::vector<Group> groups;  // the file's groups other than POINT, ANALOG and TRIAL
@@ -61,9 +97,13 @@ struct Take {
 // The groups that the application writes itself; every other group is kept as it was read.
 inline constexpr std::string_view kOwnGroups[] = {"POINT", "ANALOG", "TRIAL"};
 
-// The take a C3D file holds; throws Failure when the file is damaged or holds what the application
-// cannot take (coordinates in units other than mm, cm or m).
-Take Read(std::string_view file);
+// Whether `name` can name a group or parameter: 1 to 127 printable ASCII characters.
+bool ValidName(std::string_view name);
+
+// The take a C3D file holds (which keeps the file's bytes for its analog samples); throws Failure
+// when the file is damaged or holds what the application cannot take (coordinates in units other
+// than mm, cm or m).
+Take Read(std::string file);
 
 // The file of `take` in the Intel form with float data; throws Failure when the take does not fit
 // a C3D file (a value beyond the float range, a label of more than 255 bytes, too many points).

@@ -75,19 +75,18 @@ Take TakeOf(Scene& scene) {
 
 // Writes the tracks into `scene`, making the subjects and markers that are missing.
 void Apply(Scene& scene, Take& take) {
-  std::map<std::pair<std::string, std::string>, bool> seen;
+  std::set<std::pair<std::string_view, std::string_view>> seen;
   for (Track& track : take.tracks) {
-    std::string label = track.subject + ":" + track.marker;
-    for (const std::string& name : {track.subject, track.marker})
-      if (std::string why = BadName(name); !why.empty()) Refuse("the point '" + label + "' cannot be imported: " + why);
-    if (seen[{track.subject, track.marker}]) Refuse("the point '" + label + "' cannot be imported: the file holds it twice");
-    seen[{track.subject, track.marker}] = true;
+    auto refuse = [&](const std::string& why) { Refuse("the point '" + track.subject + ":" + track.marker + "' cannot be imported: " + why); };
+    for (const std::string* name : {&track.subject, &track.marker})
+      if (std::string why = BadName(*name); !why.empty()) refuse(why);
+    if (!seen.insert({track.subject, track.marker}).second) refuse("the file holds it twice");
     Object* subject = scene.Child(scene.Root(), track.subject);
     if (!subject) subject = &scene.Add(scene.root, "Subject", track.subject);
-    if (subject->type != "Subject") Refuse("the point '" + label + "' cannot be imported: '" + track.subject + "' is a " + subject->type);
+    if (subject->type != "Subject") refuse("'" + track.subject + "' is a " + subject->type);
     Object* marker = scene.Child(*subject, track.marker);
     if (!marker) marker = &scene.Add(subject->id, "Marker", track.marker);
-    if (marker->type != "Marker") Refuse("the point '" + label + "' cannot be imported: '" + track.marker + "' is a " + marker->type);
+    if (marker->type != "Marker") refuse("'" + track.marker + "' is a " + marker->type);
     for (int axis = 0; axis < 3; ++axis) {
       Channel& channel = *marker->FindChannel(kAxes[axis]);
       channel.values = std::move(track.values[axis]);
@@ -279,7 +278,7 @@ std::string Unique(const std::string& base, Taken taken) {
 // suffix _2, _3, ...; labelled points are named first, in the file's order, so the first occurrence
 // of a label keeps it. Every renamed point is reported in `log`.
 void NamePoints(Take& take, const std::vector<c3d::Point>& points, std::vector<std::string>& log) {
-  std::set<std::pair<std::string, std::string>> taken;
+  std::set<std::pair<std::string_view, std::string_view>> taken;  // the names of take.tracks given so far
   for (int pass = 0; pass < 2; ++pass)
     for (std::size_t p = 0; p < points.size(); ++p) {
       std::string label = NameText(points[p].label);
@@ -289,8 +288,8 @@ void NamePoints(Take& take, const std::vector<c3d::Point>& points, std::vector<s
       if (marker.empty() != (pass == 1)) continue;
       std::string base = marker.empty() ? "Point" + std::to_string(p + 1) : marker;
       marker = Unique(base, [&](const std::string& name) { return taken.contains({subject, name}); });
-      taken.insert({subject, marker});
       take.tracks[p].subject = subject, take.tracks[p].marker = marker;
+      taken.insert({take.tracks[p].subject, take.tracks[p].marker});
       std::string named = " is named '" + subject + ":" + marker + "'";
       if (pass == 1) log.push_back("point " + std::to_string(p + 1) + " has no label: it" + named);
       else if (marker != base) log.push_back("the label '" + label + "' is repeated: its point " + std::to_string(p + 1) + named);
@@ -328,7 +327,7 @@ void DropAnalog(Scene& scene) {
 }
 
 void AddAnalog(Scene& scene, c3d::Take& file, std::vector<std::string>& log) {
-  scene.analog = {static_cast<int>(file.samplesPerFrame), file.generalScale, {}};
+  scene.analog = {file.samples, file.generalScale, {}};
   scene.fileGroups = std::move(file.groups);
   for (std::size_t c = 0; c < file.analog.size(); ++c) {
     c3d::Analog& channel = file.analog[c];
@@ -340,7 +339,7 @@ void AddAnalog(Scene& scene, c3d::Take& file, std::vector<std::string>& log) {
     o.FindAttribute("Unit")->value = Utf8(channel.unit);
     o.FindAttribute("Scale")->value = *Canonical(ValueType::Float, FloatText(channel.scale));
     o.FindAttribute("Offset")->value = *Canonical(ValueType::Float, FloatText(channel.offset));
-    scene.analog.samples[o.id] = std::move(channel.samples);
+    scene.analog.column[o.id] = channel.column;
   }
 }
 
@@ -357,11 +356,11 @@ c3d::Take C3dOf(Scene& scene, Take& take) {
     for (std::size_t f = 0; f < file.frames; ++f) point.seen[f] = track.keys[0][f] && track.keys[1][f] && track.keys[2][f];
     for (int axis = 0; axis < 3; ++axis) point.axis[axis] = std::move(track.values[axis]);
   }
-  file.samplesPerFrame = static_cast<std::size_t>(scene.analog.samplesPerFrame);
+  file.samples = scene.analog.data;
   file.generalScale = scene.analog.generalScale;
   for (Object* o : scene.OfType(scene.Root(), "Analog"))
     file.analog.push_back({o->name, o->Text("Description"), o->Text("Unit"), ParseDouble(o->Text("Scale")).value_or(1),
-                           ParseDouble(o->Text("Offset")).value_or(0), scene.analog.samples.at(o->id)});
+                           ParseDouble(o->Text("Offset")).value_or(0), scene.analog.column.at(o->id)});
   file.groups = scene.fileGroups;
   return file;
 }
@@ -403,7 +402,7 @@ void ImportFile(Context& context, Reader& in, Writer&) {
   if (!platform::ReadFile(FilePlace(path), bytes, kMaxImport)) Refuse("cannot read the file '" + path + "'");
   std::vector<std::string> log;
   c3d::Take file;
-  if (format == Format::C3d) file = c3d::Read(bytes), log = file.notes;
+  if (format == Format::C3d) file = c3d::Read(std::move(bytes)), log = file.notes;
   Take take = format == Format::Csv ? ReadCsv(bytes) : TracksOf(file, log);
   bytes.clear();
 

@@ -65,8 +65,9 @@ std::string ValueOf(Scene& scene, Object& o, const Attribute& a) {
     std::vector<double> w = scene.WorldTranslation(o.id);
     return NumberText(w[0]) + "," + NumberText(w[1]) + "," + NumberText(w[2]);
   }
-  if (a.name == "Rate") return NumberText(scene.timeline.rate * scene.analog.samplesPerFrame);
-  if (a.name == "Samples") return std::to_string(std::int64_t{scene.frames} * scene.analog.samplesPerFrame);
+  std::size_t perFrame = scene.analog.data.samplesPerFrame();
+  if (a.name == "Rate") return NumberText(scene.timeline.rate * static_cast<double>(perFrame));
+  if (a.name == "Samples") return std::to_string(static_cast<std::size_t>(scene.frames) * perFrame);
   return a.value;
 }
 

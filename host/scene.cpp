@@ -318,7 +318,7 @@ void Scene::Remove(ObjectId id) {
   siblings.erase(std::find(siblings.begin(), siblings.end(), id));
   for (ObjectId each : gone) {
     if (objects.at(each).type == "Analog") {
-      analog.samples.erase(each);
+      analog.column.erase(each);
       std::erase_if(fileGroups, [](const c3d::Group& g) { return g.name == "FORCE_PLATFORM"; });
     }
     objects.erase(each);

@@ -135,13 +135,13 @@ struct Timeline {
   void Set(std::uint64_t time);
 };
 
-// The samples of the take's analog channels, by the id of each channel's Analog object: every
-// channel has samplesPerFrame samples a frame, the file's own numbers. A channel's physical values
-// are (sample - its Offset) x its Scale x generalScale.
+// The samples of the take's analog channels: each channel's Analog object has its column of `data`
+// (the file's own numbers, samplesPerFrame a frame). A channel's physical values are (sample - its
+// Offset) x its Scale x generalScale.
 struct AnalogSamples {
-  int samplesPerFrame = 0;
+  c3d::AnalogData data;
   double generalScale = 1;
-  std::unordered_map<ObjectId, std::vector<float>> samples;
+  std::unordered_map<ObjectId, std::size_t> column;
 };
 
 struct Scene {

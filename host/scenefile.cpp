@@ -123,6 +123,7 @@ std::vector<c3d::Group> ReadGroups(const std::vector<std::vector<std::string_vie
     const auto& w = lines[at];
     if (w[0] == "group" && w.size() == 3) {
       groups.push_back({Decode(w[1], at + 1), Decode(w[2], at + 1), {}});
+      if (!c3d::ValidName(groups.back().name) || groups.back().description.size() > 255) Bad(at + 1, "a bad group");
       continue;
     }
     if (w.size() != 6 || groups.empty()) Bad(at + 1, "a group parameter out of place");
@@ -135,10 +136,36 @@ std::vector<c3d::Group> ReadGroups(const std::vector<std::vector<std::string_vie
       if (d < 0 || d > 255) Bad(at + 1, "a bad dimension");
       p.dims.push_back(static_cast<std::uint8_t>(d)), size *= static_cast<std::size_t>(d);
     }
-    if (size != p.data.size() || p.name.empty() || p.name.size() > 127 || p.description.size() > 255) Bad(at + 1, "a bad group parameter");
+    if (size != p.data.size() || !c3d::ValidName(p.name) || p.description.size() > 255) Bad(at + 1, "a bad group parameter");
     groups.back().parameters.push_back(std::move(p));
   }
   return groups;
+}
+
+// The analog channels' samples as the lines give them, before they become the scene's.
+struct AnalogLines {
+  std::size_t samplesPerFrame = 0;
+  double generalScale = 1;
+  std::vector<std::vector<float>> channels;
+};
+
+// The line `analog SAMPLES_PER_FRAME GENERAL_SCALE`, where there is one.
+AnalogLines ReadAnalog(const std::vector<std::vector<std::string_view>>& lines, std::size_t& at) {
+  if (at >= lines.size() || lines[at][0] != "analog") return {};
+  const auto& w = lines[at++];
+  auto perFrame = w.size() == 3 ? ParseInt(w[1]) : std::nullopt;
+  auto general = w.size() == 3 ? ParseDouble(w[2]) : std::nullopt;
+  if (!perFrame || *perFrame < 1 || *perFrame > 65535 || !general) Bad(at, "a bad 'analog' line");
+  return {static_cast<std::size_t>(*perFrame), *general, {}};
+}
+
+// An Analog object's samples: one list of samplesPerFrame for every frame.
+void ReadSamples(std::string_view list, std::size_t line, Scene& scene, const Object& object, AnalogLines& analog) {
+  if (object.type != "Analog" || scene.analog.column.contains(object.id) || analog.samplesPerFrame == 0) Bad(line, "samples out of place");
+  scene.analog.column[object.id] = analog.channels.size();
+  analog.channels.push_back(NumbersOf<float>(list, line));
+  if (analog.channels.back().size() != static_cast<std::size_t>(scene.frames) * analog.samplesPerFrame)
+    Bad(line, "an analog channel without its samples for every frame");
 }
 
 std::string Ranges(const std::vector<bool>& selected) {
@@ -167,8 +194,8 @@ std::string WriteScene(Scene& scene) {
     for (const std::string& value : scene.settings.values[r]) out.append(1, ' ').append(Encode(value));
     out += "\n";
   }
-  if (scene.analog.samplesPerFrame > 0)
-    out += "analog " + std::to_string(scene.analog.samplesPerFrame) + " " + NumberText(scene.analog.generalScale) + "\n";
+  if (scene.analog.data.samplesPerFrame() > 0)
+    out += "analog " + std::to_string(scene.analog.data.samplesPerFrame()) + " " + NumberText(scene.analog.generalScale) + "\n";
   out += Groups(scene.fileGroups);
   std::map<ObjectId, std::size_t> index;
   std::vector<ObjectId> order{scene.root};
@@ -193,8 +220,8 @@ std::string WriteScene(Scene& scene) {
       for (std::size_t f = 0; f < c.keys.size(); ++f) out += c.selected[f] ? '2' : c.keys[f] ? '1' : '0';
       out += "\n";
     }
-    if (auto samples = scene.analog.samples.find(id); samples != scene.analog.samples.end())
-      out += "samples " + Joined(samples->second, FloatText) + "\n";
+    if (auto column = scene.analog.column.find(id); column != scene.analog.column.end())
+      out += "samples " + Joined(scene.analog.data.Channel(column->second), FloatText) + "\n";
   }
   out += "selection";
   for (ObjectId id : scene.selection) out.append(1, ' ').append(std::to_string(index.at(id)));
@@ -278,12 +305,8 @@ Scene ReadScene(std::string_view text) {
   Scene scene(frames);
   scene.timeline = t;
   scene.settings = settings;
-  if (at < lines.size() && lines[at][0] == "analog") {
-    auto& a = next("analog", 2, 2);
-    auto general = ParseDouble(a[2]);
-    if (!general) Bad(at, "a bad general scale");
-    scene.analog = {number(a[1], 1, 65535), *general, {}};
-  }
+  AnalogLines analog = ReadAnalog(lines, at);
+  scene.analog.generalScale = analog.generalScale;
   scene.fileGroups = ReadGroups(lines, at);
   std::vector<ObjectId> ids;
   while (at < lines.size() && lines[at][0] == "object") {
@@ -307,12 +330,7 @@ Scene ReadScene(std::string_view text) {
                                  lines[at][0] == "samples")) {
       std::string_view kind = lines[at][0];
       if (kind == "samples") {
-        auto& s = next("samples", 1, 1);
-        auto& samples = scene.analog.samples[object->id];
-        if (object->type != "Analog" || !samples.empty() || scene.analog.samplesPerFrame == 0) Bad(at, "samples out of place");
-        samples = NumbersOf<float>(s[1], at);
-        if (samples.size() != static_cast<std::size_t>(frames) * static_cast<std::size_t>(scene.analog.samplesPerFrame))
-          Bad(at, "an analog channel without its samples for every frame");
+        ReadSamples(next("samples", 1, 1)[1], at, scene, *object, analog);
       } else if (kind == "attribute") {
         auto& a = next("attribute", 2, 2);
         std::string aname = Decode(a[1], at);
@@ -365,7 +383,9 @@ Scene ReadScene(std::string_view text) {
   }
   if (ids.empty()) Bad(at + 1, "no scene object");
   for (ObjectId id : ids)
-    if (scene.objects.at(id).type == "Analog" && !scene.analog.samples.contains(id)) Bad(at + 1, "an analog channel without samples");
+    if (scene.objects.at(id).type == "Analog" && !scene.analog.column.contains(id)) Bad(at + 1, "an analog channel without samples");
+  if (analog.samplesPerFrame > 0)
+    scene.analog.data = c3d::AnalogData::FromChannels(analog.channels, analog.samplesPerFrame, static_cast<std::size_t>(frames));
   auto& selection = next("selection", 0, ids.size());
   for (std::size_t i = 1; i < selection.size(); ++i) {
     ObjectId id = ids[static_cast<std::size_t>(number(selection[i], 1, static_cast<long>(ids.size()) - 1))];

@@ -181,6 +181,21 @@ def test_analog_channels_are_saved_with_the_scene(app, tmp_path):
     assert written.groups == original.groups
 
 
+@pytest.mark.parametrize("damage, why", [
+    (lambda text: text.replace("\nanalog 10 ", "\nanalog 0 ", 1), "a bad 'analog' line"),
+    (lambda text: text.replace("\nsamples ", "\nsamples 1,", 1), "an analog channel without its samples for every frame"),
+    (lambda text: "\n".join(line for line in text.split("\n") if not line.startswith("samples ")), "an analog channel without samples"),
+    (lambda text: text.replace("object 2 0 Subject", "samples 1\nobject 2 0 Subject", 1), "samples out of place"),
+    (lambda text: text.replace("\ngroupparameter ", "\ngroupparameter %00", 1), "a bad group parameter"),
+])
+def test_a_damaged_scene_file_with_analog_channels_is_refused(app, tmp_path, damage, why):
+    import_take(app, CORPUS / "sample_07_16bitanalog.c3d")
+    app.SaveFile(str(tmp_path / "good.scene"), "")
+    (tmp_path / "bad.scene").write_text(damage((tmp_path / "good.scene").read_text()))
+    code, message = app.refusal("LoadFile", str(tmp_path / "bad.scene"))
+    assert code == m.ApplicationError and message.startswith("the scene file is damaged at line ") and message.endswith(why)
+
+
 def test_a_removed_channel_is_not_written_and_takes_the_force_plates_with_it(app, tmp_path):
     name = "sample_01_Eb015pi.c3d"
     import_take(app, CORPUS / name)
