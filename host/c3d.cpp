@@ -136,7 +136,7 @@ class Parameters {
   std::vector<Group> Others() const {
     std::vector<Group> out;
     for (const auto& [id, g] : groups_)
-      if (!g.name.empty() && std::find(std::begin(kOwnGroups), std::end(kOwnGroups), g.name) == std::end(kOwnGroups)) out.push_back(g);
+      if (!g.name.empty() && !OwnGroup(g.name)) out.push_back(g);
     return out;
   }
 
@@ -274,6 +274,14 @@ struct Layout {
 // A parameter's value where it is usable (a finite number above 0), else the header's.
 double Usable(std::optional<double> parameter, double header) { return parameter && *parameter > 0 ? *parameter : header; }
 
+// The count a parameter gives (a whole number from 0 to 65535), or `header` where it gives none.
+std::size_t CountOf(const Parameter* p, std::size_t header, const char* what) {
+  std::optional<double> n = Number(p);
+  if (!n) return header;
+  if (!(*n >= 0 && *n <= 65535)) Damaged("its " + std::string(what) + " is not a number from 0 to 65535");
+  return static_cast<std::size_t>(*n);
+}
+
 double UnitFactor(const Parameters& ps) {
   std::vector<std::string> units = Texts(ps.Find("POINT", "UNITS"));
   std::string unit = units.empty() ? std::string() : Upper(units[0]);
@@ -290,13 +298,12 @@ Layout LayoutOf(const Header& h, const Parameters& ps, Form form) {
   l.scale = scale && *scale != 0 ? *scale : h.scale;
   if (!std::isfinite(l.scale) || l.scale == 0) Damaged("its scale factor is not a number other than 0");
   l.floats = l.scale < 0;
-  std::optional<double> points = Number(ps.Find("POINT", "USED")), channels = Number(ps.Find("ANALOG", "USED"));
-  l.points = points ? static_cast<std::size_t>(*points) : h.points;
-  l.channels = channels ? static_cast<std::size_t>(*channels) : h.analogWords / std::max<std::size_t>(1, h.samplesPerFrame);
+  l.points = CountOf(ps.Find("POINT", "USED"), h.points, "point count");
+  l.channels = CountOf(ps.Find("ANALOG", "USED"), h.analogWords / std::max<std::size_t>(1, h.samplesPerFrame), "analog channel count");
   std::vector<std::string> format = Texts(ps.Find("ANALOG", "FORMAT"));
   l.unsignedAnalog = !format.empty() && Upper(format[0]) == "UNSIGNED";
   std::size_t dataBlock = h.dataBlock;
-  if (dataBlock <= h.parameterBlock) dataBlock = static_cast<std::size_t>(Usable(Number(ps.Find("POINT", "DATA_START")), 0));
+  if (dataBlock <= h.parameterBlock) dataBlock = CountOf(ps.Find("POINT", "DATA_START"), 0, "data start");
   if (dataBlock <= h.parameterBlock) Damaged("its data do not start after its parameters");
   l.start = (dataBlock - 1) * kBlock;
   return l;
@@ -343,8 +350,16 @@ std::size_t FrameCount(std::string_view file, const Header& h, const Parameters&
   Damaged("it ends before its last frame");
 }
 
-// Coordinates in the file's unit are floats, or 16-bit integers times the scale (rounded to a float,
-// so that both forms of the same data give the same numbers), then turned to millimetres by `factor`.
+// A coordinate in the file's unit: a float, or a 16-bit integer times the scale, rounded to a float
+// (so that both forms of the same data give the same numbers); infinite where it is beyond a float.
+template <Form F, bool Floats>
+float Coordinate(const char* at, double scale) {
+  if constexpr (Floats) return Real<F>(at);
+  double value = static_cast<std::int16_t>(Load16(at, F == Form::Mips)) * scale;
+  return std::fabs(value) <= std::numeric_limits<float>::max() ? static_cast<float>(value) : std::numeric_limits<float>::infinity();
+}
+
+// Coordinates turned to millimetres by `factor`, where the fourth word says the point was seen.
 template <Form F, bool Floats>
 void ReadPoints(std::string_view file, const Layout& l, double factor, Take& take) {
   for (std::size_t f = 0; f < take.frames; ++f) {
@@ -352,10 +367,8 @@ void ReadPoints(std::string_view file, const Layout& l, double factor, Take& tak
     for (std::size_t p = 0; p < l.points; ++p) {
       const char* at = row + p * 4 * l.Word();
       float xyz[3];
-      bool seen;
-      for (int a = 0; a < 3; ++a)
-        xyz[a] = Floats ? Real<F>(at + 4 * a) : static_cast<float>(static_cast<std::int16_t>(Load16(at + 2 * a, F == Form::Mips)) * l.scale);
-      seen = Floats ? Real<F>(at + 12) >= 0 : static_cast<std::int16_t>(Load16(at + 6, F == Form::Mips)) >= 0;
+      for (int a = 0; a < 3; ++a) xyz[a] = Coordinate<F, Floats>(at + a * l.Word(), l.scale);
+      bool seen = Floats ? Real<F>(at + 12) >= 0 : static_cast<std::int16_t>(Load16(at + 6, F == Form::Mips)) >= 0;
       if (!(seen && std::isfinite(xyz[0]) && std::isfinite(xyz[1]) && std::isfinite(xyz[2]))) continue;
       Point& point = take.points[p];
       for (int a = 0; a < 3; ++a) point.axis[a][f] = xyz[a] * factor;
@@ -396,6 +409,11 @@ void ReadAnalog(std::shared_ptr<const std::string> file, const Parameters& ps, c
 
 bool ValidName(std::string_view name) {
   return !name.empty() && name.size() <= 127 && std::all_of(name.begin(), name.end(), [](char c) { return c >= 0x20 && c <= 0x7e; });
+}
+
+bool OwnGroup(std::string_view name) {
+  std::string upper = Upper(name);
+  return upper == "POINT" || upper == "ANALOG" || upper == "TRIAL";
 }
 
 Take Read(std::string bytes) {

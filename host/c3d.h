@@ -94,11 +94,11 @@ struct Take {
   std::vector<std::string> notes;  // how disagreements between header and parameters were settled
 };
 
-// The groups that the application writes itself; every other group is kept as it was read.
-inline constexpr std::string_view kOwnGroups[] = {"POINT", "ANALOG", "TRIAL"};
-
 // Whether `name` can name a group or parameter: 1 to 127 printable ASCII characters.
 bool ValidName(std::string_view name);
+// Whether `name` names, in any case, one of the groups that the application writes itself (POINT,
+// ANALOG, TRIAL); every other group is kept as it was read.
+bool OwnGroup(std::string_view name);
 
 // The take a C3D file holds (which keeps the file's bytes for its analog samples); throws Failure
 // when the file is damaged or holds what the application cannot take (coordinates in units other

@@ -123,7 +123,8 @@ std::vector<c3d::Group> ReadGroups(const std::vector<std::vector<std::string_vie
     const auto& w = lines[at];
     if (w[0] == "group" && w.size() == 3) {
       groups.push_back({Decode(w[1], at + 1), Decode(w[2], at + 1), {}});
-      if (!c3d::ValidName(groups.back().name) || groups.back().description.size() > 255) Bad(at + 1, "a bad group");
+      const c3d::Group& g = groups.back();
+      if (!c3d::ValidName(g.name) || c3d::OwnGroup(g.name) || g.description.size() > 255) Bad(at + 1, "a bad group");
       continue;
     }
     if (w.size() != 6 || groups.empty()) Bad(at + 1, "a group parameter out of place");

@@ -154,13 +154,16 @@ def _parameter(group, name, type_, dims, data, description=b""):
 
 
 def _texts_parameter(group, name, texts):
+    texts = [t if isinstance(t, bytes) else t.encode() for t in texts]
     width = max([1] + [len(t) for t in texts])
-    return _parameter(group, name, -1, [width, len(texts)], b"".join(t.encode().ljust(width) for t in texts))
+    return _parameter(group, name, -1, [width, len(texts)], b"".join(t.ljust(width) for t in texts))
 
 
-def build(points, labels, rate=100.0, units="mm", scale=-1.0, analog=None, analog_per_frame=1):
+def build(points, labels, rate=100.0, units="mm", scale=-1.0, analog=None, analog_per_frame=1, offsets=None):
     """A C3D file: `points` frames x points x 4 (x, y, z, fourth word; int16 when scale > 0), labels
-    in parameters of 255 at most (LABELS, LABELS2, ...), `analog` frames x samples x channels."""
+    (str, or bytes as they stand in the file) in parameters of 255 at most (LABELS, LABELS2, ...),
+    `analog` frames x samples x channels; `offsets` (with integer data) makes the analog samples
+    unsigned, with ANALOG:FORMAT UNSIGNED and those ANALOG:OFFSET."""
     frames, count = points.shape[:2]
     channels = 0 if analog is None else analog.shape[2]
     items = [struct.pack("<bb", 5, -1) + b"POINT" + struct.pack("<HB", 3, 0),
@@ -178,6 +181,9 @@ def build(points, labels, rate=100.0, units="mm", scale=-1.0, analog=None, analo
                   _parameter(2, "USED", 2, [], struct.pack("<H", channels)),
                   _parameter(2, "RATE", 4, [], struct.pack("<f", rate * analog_per_frame)),
                   _texts_parameter(2, "LABELS", [f"EMG{c + 1}" for c in range(channels)])]
+    if offsets is not None:
+        items += [_parameter(2, "FORMAT", -1, [8], b"UNSIGNED"),
+                  _parameter(2, "OFFSET", 2, [channels], struct.pack(f"<{channels}H", *offsets))]
     section = b"".join(items) + b"\0\0"
     blocks = (4 + len(section) + 511) // 512
     section = (bytes([1, 0x50, blocks, 84]) + section).ljust(blocks * 512, b"\0")
@@ -186,5 +192,6 @@ def build(points, labels, rate=100.0, units="mm", scale=-1.0, analog=None, analo
     dtype = "<f4" if scale < 0 else "<i2"
     data = points.astype(dtype).reshape(frames, -1)
     if channels:
-        data = np.concatenate([data, analog.astype(dtype).reshape(frames, -1)], axis=1)
+        samples = analog.astype("<u2" if offsets is not None else dtype).reshape(frames, -1)
+        data = np.concatenate([data, samples.view(data.dtype)], axis=1)
     return header + section + data.tobytes()

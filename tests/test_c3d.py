@@ -3,6 +3,7 @@ corpus file in tests/data/c3d imported and exported again, markers in millimetre
 and the groups the application does not use; hand-made files for what the corpus lacks."""
 import functools
 import math
+import re
 from fractions import Fraction
 
 import _Client3 as m
@@ -187,6 +188,8 @@ def test_analog_channels_are_saved_with_the_scene(app, tmp_path):
     (lambda text: "\n".join(line for line in text.split("\n") if not line.startswith("samples ")), "an analog channel without samples"),
     (lambda text: text.replace("object 2 0 Subject", "samples 1\nobject 2 0 Subject", 1), "samples out of place"),
     (lambda text: text.replace("\ngroupparameter ", "\ngroupparameter %00", 1), "a bad group parameter"),
+    (lambda text: text.replace("\ngroup FORCE_PLATFORM ", "\ngroup point ", 1), "a bad group"),
+    (lambda text: re.sub(r"\ngroup [^\n]*", "", text, count=1), "a group parameter out of place"),
 ])
 def test_a_damaged_scene_file_with_analog_channels_is_refused(app, tmp_path, damage, why):
     import_take(app, CORPUS / "sample_07_16bitanalog.c3d")
@@ -205,6 +208,20 @@ def test_a_removed_channel_is_not_written_and_takes_the_force_plates_with_it(app
     assert written.analog_labels == [label for label in original.analog_labels if label != "FY1"]
     assert np.array_equal(written.analog, np.delete(original.analog, 1, axis=1))
     assert written.groups == {group: items for group, items in original.groups.items() if group != "FORCE_PLATFORM"}
+
+
+def test_scripts_rename_and_describe_analog_channels(app, tmp_path):
+    import_take(app, CORPUS / "sample_30_admarche2.c3d")
+    channel = app.SceneGetObject("/el-0")[0]
+    app.ObjectSetAttributeValue(channel, "Name", "Left soleus")
+    app.ObjectSetAttributeValue(channel, "Unit", "mV")
+    assert app.refusal("ObjectSetAttributeValue", channel, "Scale", "2") == (
+        m.ApplicationError, f"attribute 'Scale' of object {channel} is read-only")
+    app.TimelineSetFrameRate(100.0)
+    assert app.ObjectGetAttributeValue(channel, "Rate")[2] == "100"
+    app.ExportFile(str(tmp_path / "renamed.c3d"), "")
+    written = independent(tmp_path / "renamed.c3d", strict=True)
+    assert (written.analog_labels[0], written.analog_units[0], written.analog_rate) == ("Left soleus", "mV", 100.0)
 
 
 def test_analog_objects_cannot_be_made_by_scripts(app):
@@ -245,6 +262,25 @@ def test_more_frames_than_a_header_can_count(app, tmp_path):
     assert app.GetFrameCount() == 70_000
     x, _, _, e = app.GetTrajectory("Unlabeled", "P")
     assert x[:-1] == [v * 500.0 for v in raw[:-1, 0, 0]] and e == [True] * 69_999 + [False]
+
+
+def test_unsigned_analog_samples_and_offsets_are_written_back(app, tmp_path):
+    raw = np.zeros((20, 1, 4), np.int16)
+    raw[:, 0, :3] = (1, 2, 3)
+    emg = (np.arange(20 * 2 * 2).reshape(20, 2, 2) * 1000 + 30_000) % 65_536  # many above 32767
+    (tmp_path / "unsigned.c3d").write_bytes(build(raw, ["A:B"], scale=0.5, analog=emg, analog_per_frame=2, offsets=[40_000, 2048]))
+    import_take(app, tmp_path / "unsigned.c3d")
+    app.ExportFile(str(tmp_path / "out.c3d"), "")
+    expected = emg.transpose(0, 2, 1) - np.array([40_000, 2048])[None, :, None]  # frames x channels x samples
+    assert np.array_equal(independent(tmp_path / "unsigned.c3d").analog, expected)
+    assert np.array_equal(independent(tmp_path / "out.c3d", strict=True).analog, expected)
+
+
+def test_labels_become_names_an_object_can_have(app, tmp_path):
+    labels = [b"\xc9paule", "Épaule".encode(), b"a/b:c\x01d", b""]  # Latin-1, UTF-8, bad characters, none
+    (tmp_path / "labels.c3d").write_bytes(build(walk(3, 4), labels))
+    assert import_take(app, tmp_path / "labels.c3d") == {
+        ("Unlabeled", "Épaule"), ("Unlabeled", "Épaule_2"), ("a_b", "c_d"), ("Unlabeled", "Point4")}
 
 
 def test_a_merge_replaces_analog_channels_only_when_the_file_brings_some(app, tmp_path):
