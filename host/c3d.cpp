@@ -22,6 +22,11 @@ constexpr std::size_t kMaxFrames = 1'000'000;
 
 [[noreturn]] void Damaged(const std::string& why) { Refuse("the C3D file is damaged: " + why); }
 
+std::string Shortest(double value) {
+  char text[32];
+  return std::string(text, std::to_chars(text, text + sizeof text, value).ptr);
+}
+
 // `text` when it is printable ASCII, else a description that holds none of its bytes.
 std::string Shown(std::string_view text) {
   for (char c : text)
@@ -291,20 +296,30 @@ double UnitFactor(const Parameters& ps) {
   Refuse("the C3D file's points are in '" + Shown(units[0]) + "', not in mm, cm or m");
 }
 
-Layout LayoutOf(const Header& h, const Parameters& ps, Form form) {
+// Notes where the header gives another `what` than the parameters, and which was taken.
+void Compare(std::vector<std::string>& notes, const char* what, double header, double parameter, bool headerTaken) {
+  if (header != parameter)
+    notes.push_back("its header gives " + Shortest(header) + " as its " + what + " and its parameters " + Shortest(parameter) + ": " +
+                    Shortest(headerTaken ? header : parameter) + " was taken");
+}
+
+Layout LayoutOf(const Header& h, const Parameters& ps, Form form, std::vector<std::string>& notes) {
   Layout l;
   l.form = form;
   std::optional<double> scale = Number(ps.Find("POINT", "SCALE"));
   l.scale = scale && *scale != 0 ? *scale : h.scale;
   if (!std::isfinite(l.scale) || l.scale == 0) Damaged("its scale factor is not a number other than 0");
+  if (scale && *scale != 0) Compare(notes, "scale", h.scale, *scale, false);
   l.floats = l.scale < 0;
   l.points = CountOf(ps.Find("POINT", "USED"), h.points, "point count");
+  Compare(notes, "point count", static_cast<double>(h.points), static_cast<double>(l.points), false);
   l.channels = CountOf(ps.Find("ANALOG", "USED"), h.analogWords / std::max<std::size_t>(1, h.samplesPerFrame), "analog channel count");
   std::vector<std::string> format = Texts(ps.Find("ANALOG", "FORMAT"));
   l.unsignedAnalog = !format.empty() && Upper(format[0]) == "UNSIGNED";
-  std::size_t dataBlock = h.dataBlock;
-  if (dataBlock <= h.parameterBlock) dataBlock = CountOf(ps.Find("POINT", "DATA_START"), 0, "data start");
+  std::size_t dataBlock = h.dataBlock, given = CountOf(ps.Find("POINT", "DATA_START"), 0, "data start");
+  if (dataBlock <= h.parameterBlock) dataBlock = given;
   if (dataBlock <= h.parameterBlock) Damaged("its data do not start after its parameters");
+  if (given > h.parameterBlock) Compare(notes, "data start", static_cast<double>(h.dataBlock), static_cast<double>(given), dataBlock == h.dataBlock);
   l.start = (dataBlock - 1) * kBlock;
   return l;
 }
@@ -436,7 +451,8 @@ Take Read(std::string bytes) {
   Take take;
   take.rate = Usable(Number(ps.Find("POINT", "RATE")), h.rate);
   if (!(take.rate > 0) || !std::isfinite(take.rate)) Damaged("its frame rate is not a positive number");
-  Layout l = LayoutOf(h, ps, form);
+  Layout l = LayoutOf(h, ps, form, take.notes);
+  if (std::optional<double> rate = Number(ps.Find("POINT", "RATE")); rate && *rate > 0) Compare(take.notes, "frame rate", h.rate, *rate, false);
   l.samplesPerFrame = SamplesPerFrame(h, ps, take.rate, l.channels);
   l.frameBytes = (l.points * 4 + l.channels * l.samplesPerFrame) * l.Word();
   take.frames = FrameCount(file, h, ps, l, take.notes);
@@ -673,11 +689,6 @@ std::string ParameterSection(const Take& take, std::uint16_t dataBlock) {
       if (Fits(parameter)) p.Add(id, parameter);
   }
   return p.Finish();
-}
-
-std::string Shortest(double value) {
-  char text[32];
-  return std::string(text, std::to_chars(text, text + sizeof text, value).ptr);
 }
 
 void CheckWritable(const Take& take) {

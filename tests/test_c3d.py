@@ -4,6 +4,7 @@ and the groups the application does not use; hand-made files for what the corpus
 import functools
 import math
 import re
+import struct
 from fractions import Fraction
 
 import _Client3 as m
@@ -127,13 +128,27 @@ def test_the_six_forms_of_set_01_give_one_answer(app):
         assert np.array_equal(answer[3][0], first[3][0]) and np.array_equal(answer[3][1], first[3][1])
 
 
-def test_repeated_labels_are_renamed_and_logged(app, host):
+def test_repeated_labels_and_a_short_frame_count_are_logged(app, host):
     names = point_names(seen_in("sample_00_Motion_Analysis_Corporation_Walk1.c3d").labels)
     assert names[25] == ("Unlabeled", "RKNE_2") and names[41:43] == [("Unlabeled", "VMID_2"), ("Unlabeled", "VMID_3")]
     import_take(app, CORPUS / "sample_00_Motion_Analysis_Corporation_Walk1.c3d")
+    import_take(app, CORPUS / "sample_13_Dance.c3d")
     log = host.log()
     assert "the label 'RKNE' is repeated: its point 26 is named 'Unlabeled:RKNE_2'" in log
     assert "the label 'VMID' is repeated: its point 43 is named 'Unlabeled:VMID_3'" in log
+    assert "sample_13_Dance.c3d': it gives 500 frames and its data hold 499: 499 frames were read" in log
+
+
+def test_the_parameters_hold_where_the_header_disagrees(app, host, tmp_path):
+    data = bytearray(build(walk(4, 2), ["A:B", "A:C"], rate=50.0))
+    struct.pack_into("<H", data, 2, 7)  # the header's point count
+    struct.pack_into("<f", data, 20, 60.0)  # the header's frame rate
+    (tmp_path / "disagree.c3d").write_bytes(data)
+    assert import_take(app, tmp_path / "disagree.c3d") == {("A", "B"), ("A", "C")}
+    assert app.TimelineGetFrameRate() == 50.0
+    log = host.log()
+    assert "disagree.c3d': its header gives 7 as its point count and its parameters 2: 2 was taken" in log
+    assert "disagree.c3d': its header gives 60 as its frame rate and its parameters 50: 50 was taken" in log
 
 
 def test_the_damaged_file_is_refused_in_printable_words(app):
