@@ -75,6 +75,7 @@ Take TakeOf(Scene& scene) {
 
 // Writes the tracks into `scene`, making the subjects and markers that are missing.
 void Apply(Scene& scene, Take& take) {
+  scene.objects.reserve(scene.objects.size() + 2 * take.tracks.size());
   std::set<std::pair<std::string_view, std::string_view>> seen;
   for (Track& track : take.tracks) {
     auto refuse = [&](const std::string& why) { Refuse("the point '" + track.subject + ":" + track.marker + "' cannot be imported: " + why); };
@@ -303,11 +304,11 @@ Take TracksOf(c3d::Take& file, std::vector<std::string>& log) {
   take.rate = file.rate;
   take.tracks.resize(file.points.size());
   NamePoints(take, file.points, log);
-  for (std::size_t p = 0; p < file.points.size(); ++p)
-    for (int axis = 0; axis < 3; ++axis) {
-      take.tracks[p].values[axis] = std::move(file.points[p].axis[axis]);
-      take.tracks[p].keys[axis] = file.points[p].seen;
-    }
+  for (std::size_t p = 0; p < file.points.size(); ++p) {
+    for (int axis = 0; axis < 3; ++axis) take.tracks[p].values[axis] = std::move(file.points[p].axis[axis]);
+    take.tracks[p].keys[0] = take.tracks[p].keys[1] = file.points[p].seen;
+    take.tracks[p].keys[2] = std::move(file.points[p].seen);
+  }
   return take;
 }
 

@@ -15,8 +15,6 @@ import hostproc
 from appclient import Client
 from c3dfiles import CORPUS, analog_names, build, independent, point_names
 
-pytestmark = pytest.mark.filterwarnings("ignore:No analog data found")
-
 DAMAGED = "sample_18_bad_parameter_section.c3d"
 READABLE = [
     "sample_00_Codamotion_codamotion_gaitwands_19970212.c3d",
@@ -53,9 +51,9 @@ def seen_in(name):
 
 
 def import_take(app, path, merge=False):
+    """Imports `path`; returns the (subject, marker) names the scene then holds."""
     app.ImportFile(str(path), "", merge)
-    markers = {(s, mk) for s in app.GetSubjectNames()[0] for mk in app.GetMarkerNames(s)}
-    return markers
+    return {(s, mk) for s in app.GetSubjectNames()[0] for mk in app.GetMarkerNames(s)}
 
 
 def trajectories(app, names):
@@ -182,15 +180,15 @@ def test_a_rate_that_is_not_a_whole_number_is_kept_with_exact_ticks(app, name):
     assert app.TimelineGetFrames() == frames
 
 
-def test_analog_channels_are_saved_with_the_scene(app, tmp_path):
-    name = "sample_07_16bitanalog.c3d"
+@pytest.mark.parametrize("name", ["sample_07_16bitanalog.c3d", "sample_13_Dance.c3d"])
+def test_analog_channels_and_the_rate_are_saved_with_the_scene(app, tmp_path, name):
     import_take(app, CORPUS / name)
-    first = analog_objects(app)
+    first = analog_objects(app), app.TimelineGetFrameRate()
     app.SaveFile(str(tmp_path / "take.scene"), "")
     app.NewScene()
     assert analog_objects(app) == []
     app.LoadFile(str(tmp_path / "take.scene"))
-    assert analog_objects(app) == first
+    assert (analog_objects(app), app.TimelineGetFrameRate()) == first
     app.ExportFile(str(tmp_path / "again.c3d"), "")
     written, original = independent(tmp_path / "again.c3d", strict=True), seen_in(name)
     assert np.allclose(written.analog, original.analog, rtol=1e-6, atol=1e-9)
