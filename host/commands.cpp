@@ -22,8 +22,6 @@ using protocol::Reader;
 using protocol::Type;
 using protocol::Writer;
 
-void Refuse(std::string message) { throw Failure{Refused, std::move(message)}; }
-
 void LogLine(std::string_view level, std::string_view message) {
   std::string line;
   for (char c : message) {

@@ -3,6 +3,7 @@
 
 #include <cstdint>
 #include <string>
+#include <utility>
 
 namespace client3::host {
 
@@ -15,6 +16,6 @@ struct Failure {
 };
 
 // Throws Failure{Refused, message}.
-[[noreturn]] void Refuse(std::string message);
+[[noreturn]] inline void Refuse(std::string message) { throw Failure{Refused, std::move(message)}; }
 
 }  // namespace client3::host

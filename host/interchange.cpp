@@ -1,22 +1,18 @@
-// Importing and exporting trajectories: CSV text (one row per frame) and C3D point data.
+// Importing and exporting takes: CSV text (one row per frame, markers only) and C3D files (markers,
+// analog channels and the groups of a C3D file that the application does not use; the format itself
+// is in c3d.cpp).
 //
 // Both formats carry the markers of the scene's subjects, each named `SUBJECT:MARKER`, frame by
 // frame. Files are read whole and checked completely before the scene changes: a damaged,
 // truncated or hostile file is refused and the scene stays as it was.
-//
-// C3D files are written in the Intel floating-point form: a 512-byte header block, the parameter
-// blocks (groups POINT, ANALOG and TRIAL), then for each frame four 32-bit floats per point (x, y,
-// z and a word that is -1 where the point was not seen). Reading accepts the Intel form with float
-// or scaled 16-bit integer data, with or without analog samples (which are read past).
 #include <algorithm>
-#include <bit>
 #include <cctype>
-#include <cmath>
-#include <cstring>
-#include <limits>
+#include <charconv>
 #include <map>
+#include <set>
 
 #include "host/access.h"
+#include "host/c3d.h"
 #include "host/handlers.h"
 #include "platform/files.h"
 
@@ -79,19 +75,19 @@ Take TakeOf(Scene& scene) {
 
 // Writes the tracks into `scene`, making the subjects and markers that are missing.
 void Apply(Scene& scene, Take& take) {
-  std::map<std::pair<std::string, std::string>, bool> seen;
+  scene.objects.reserve(scene.objects.size() + 2 * take.tracks.size());
+  std::set<std::pair<std::string_view, std::string_view>> seen;
   for (Track& track : take.tracks) {
-    std::string label = track.subject + ":" + track.marker;
-    for (const std::string& name : {track.subject, track.marker})
-      if (std::string why = BadName(name); !why.empty()) Refuse("the point '" + label + "' cannot be imported: " + why);
-    if (seen[{track.subject, track.marker}]) Refuse("the point '" + label + "' cannot be imported: the file holds it twice");
-    seen[{track.subject, track.marker}] = true;
+    auto refuse = [&](const std::string& why) { Refuse("the point '" + track.subject + ":" + track.marker + "' cannot be imported: " + why); };
+    for (const std::string* name : {&track.subject, &track.marker})
+      if (std::string why = BadName(*name); !why.empty()) refuse(why);
+    if (!seen.insert({track.subject, track.marker}).second) refuse("the file holds it twice");
     Object* subject = scene.Child(scene.Root(), track.subject);
     if (!subject) subject = &scene.Add(scene.root, "Subject", track.subject);
-    if (subject->type != "Subject") Refuse("the point '" + label + "' cannot be imported: '" + track.subject + "' is a " + subject->type);
+    if (subject->type != "Subject") refuse("'" + track.subject + "' is a " + subject->type);
     Object* marker = scene.Child(*subject, track.marker);
     if (!marker) marker = &scene.Add(subject->id, "Marker", track.marker);
-    if (marker->type != "Marker") Refuse("the point '" + label + "' cannot be imported: '" + track.marker + "' is a " + marker->type);
+    if (marker->type != "Marker") refuse("'" + track.marker + "' is a " + marker->type);
     for (int axis = 0; axis < 3; ++axis) {
       Channel& channel = *marker->FindChannel(kAxes[axis]);
       channel.values = std::move(track.values[axis]);
@@ -230,304 +226,145 @@ Take ReadCsv(std::string_view text) {
   return take;
 }
 
-// ---- C3D ------------------------------------------------------------------------------------------
+// ---- C3D: names, analog channels and kept groups ---------------------------------------------------
 
-constexpr std::size_t kBlock = 512;
-constexpr std::uint8_t kKey = 0x50;
-constexpr std::uint8_t kIntel = 84;
-constexpr std::size_t kMaxLabel = 255;  // a dimension is one byte
-
-template <class T>
-void PutLe(std::string& out, T value) {
-  auto bits = std::bit_cast<std::conditional_t<sizeof(T) == 2, std::uint16_t, std::uint32_t>>(value);
-  for (std::size_t i = 0; i < sizeof(T); ++i) out += static_cast<char>((bits >> (8 * i)) & 0xff);
+// `text` as UTF-8: itself when it is valid UTF-8, else read as Latin-1 (as older capture systems
+// write their labels).
+bool ValidUtf8(std::string_view text) {
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    auto c = static_cast<unsigned char>(text[i]);
+    std::size_t more = c < 0x80 ? 0 : c >= 0xc2 && c < 0xe0 ? 1 : c >= 0xe0 && c < 0xf0 ? 2 : c >= 0xf0 && c < 0xf5 ? 3 : 4;
+    if (more == 4 || text.size() - i <= more) return false;
+    auto second = static_cast<unsigned char>(more ? text[i + 1] : 0x80);
+    if ((c == 0xe0 && second < 0xa0) || (c == 0xed && second > 0x9f) || (c == 0xf0 && second < 0x90) || (c == 0xf4 && second > 0x8f))
+      return false;
+    for (std::size_t k = 1; k <= more; ++k)
+      if ((static_cast<unsigned char>(text[i + k]) & 0xc0) != 0x80) return false;
+    i += more;
+  }
+  return true;
 }
 
-template <class T>
-T GetLe(std::string_view bytes, std::size_t at) {
-  using Bits = std::conditional_t<sizeof(T) == 1, std::uint8_t, std::conditional_t<sizeof(T) == 2, std::uint16_t, std::uint32_t>>;
-  Bits bits = 0;
-  for (std::size_t i = 0; i < sizeof(T); ++i) bits = static_cast<Bits>(bits | static_cast<Bits>(static_cast<std::uint8_t>(bytes[at + i])) << (8 * i));
-  return std::bit_cast<T>(bits);
-}
-
-void Pad(std::string& out) { out.resize((out.size() + kBlock - 1) / kBlock * kBlock, '\0'); }
-
-// The parameter section: groups, each followed by its parameters.
-class ParameterWriter {
-public:
-  void Group(std::int8_t id, std::string_view name) {
-    Item(static_cast<std::int8_t>(-id), name, std::string(1, '\0'));  // no description
-  }
-  void Int16s(std::int8_t group, std::string_view name, const std::vector<std::uint16_t>& values) {
-    std::string body{static_cast<char>(2)};
-    Dimensions(body, values.size() == 1 ? std::vector<std::size_t>{} : std::vector<std::size_t>{values.size()});
-    for (std::uint16_t v : values) PutLe(body, v);
-    Item(group, name, body + '\0');
-  }
-  void Float(std::int8_t group, std::string_view name, float value) {
-    std::string body{static_cast<char>(4), '\0'};
-    PutLe(body, value);
-    Item(group, name, body + '\0');
-  }
-  // Texts padded with blanks to the longest; split into NAME, NAME2, NAME3... so that no
-  // dimension exceeds a byte and no parameter exceeds what its offset word can skip.
-  void Texts(std::int8_t group, std::string_view name, const std::vector<std::string>& texts) {
-    std::size_t width = 1;
-    for (const std::string& t : texts) width = std::max(width, t.size());
-    std::size_t per = std::min<std::size_t>(255, 30000 / width);
-    std::size_t part = 0;
-    for (std::size_t from = 0; from < texts.size() || part == 0; from += per) {
-      std::size_t count = std::min(per, texts.size() - std::min(from, texts.size()));
-      std::string body{static_cast<char>(-1)};
-      Dimensions(body, {width, count});
-      for (std::size_t i = from; i < from + count; ++i) body += texts[i] + std::string(width - texts[i].size(), ' ');
-      Item(group, std::string(name) + (part ? std::to_string(part + 1) : ""), body + '\0');
-      ++part;
-    }
-  }
-  void Text(std::int8_t group, std::string_view name, std::string_view text) {
-    std::string body{static_cast<char>(-1)};
-    Dimensions(body, {text.size()});
-    Item(group, name, body + std::string(text) + '\0');
-  }
-  // The section with its four-byte heading, padded to whole blocks; the last item's offset is 0.
-  std::string Finish() {
-    std::size_t blocks = (4 + items_.size() + kBlock - 1) / kBlock;
-    if (blocks > 255) Refuse("too many markers for a C3D file");
-    if (last_ != std::string::npos) items_[last_] = items_[last_ + 1] = '\0';
-    std::string out{'\x01', static_cast<char>(kKey), static_cast<char>(blocks), static_cast<char>(kIntel)};
-    out += items_;
-    Pad(out);
-    return out;
-  }
-
-private:
-  static void Dimensions(std::string& body, const std::vector<std::size_t>& dims) {
-    body += static_cast<char>(dims.size());
-    for (std::size_t d : dims) body += static_cast<char>(d);
-  }
-  void Item(std::int8_t id, std::string_view name, const std::string& body) {
-    items_ += static_cast<char>(name.size());
-    items_ += static_cast<char>(id);
-    items_ += name;
-    last_ = items_.size();
-    PutLe(items_, static_cast<std::uint16_t>(body.size() + 2));
-    items_ += body;
-  }
-  std::string items_;
-  std::size_t last_ = std::string::npos;
-};
-
-std::string WriteC3d(const Take& take) {
-  if (take.tracks.size() > 65535) Refuse("too many markers for a C3D file");
-  std::vector<std::string> labels;
-  for (const Track& track : take.tracks) {
-    labels.push_back(track.subject + ":" + track.marker);
-    if (labels.back().size() > kMaxLabel) Refuse("the label '" + labels.back() + "' is longer than a C3D file allows");
-  }
-  auto frames = static_cast<std::uint32_t>(take.frames);
-  auto shortFrames = static_cast<std::uint16_t>(std::min<std::uint32_t>(frames, 65535));
-  auto rate = static_cast<float>(take.rate);
-  enum : std::int8_t { kPoint = 1, kAnalog = 2, kTrial = 3 };
-
-  // The data start depends on the parameter section's size, which does not depend on its value.
-  auto parameters = [&](std::uint16_t dataBlock) {
-    ParameterWriter p;
-    p.Group(kPoint, "POINT");
-    p.Int16s(kPoint, "USED", {static_cast<std::uint16_t>(labels.size())});
-    p.Int16s(kPoint, "FRAMES", {shortFrames});
-    p.Int16s(kPoint, "DATA_START", {dataBlock});
-    p.Float(kPoint, "SCALE", -1.0f);
-    p.Float(kPoint, "RATE", rate);
-    p.Text(kPoint, "UNITS", "mm");
-    p.Texts(kPoint, "LABELS", labels);
-    p.Texts(kPoint, "DESCRIPTIONS", std::vector<std::string>(labels.size(), ""));
-    if (frames >= 65535) p.Float(kPoint, "LONG_FRAMES", static_cast<float>(frames));
-    p.Group(kAnalog, "ANALOG");
-    p.Int16s(kAnalog, "USED", {0});
-    p.Float(kAnalog, "RATE", 0.0f);
-    p.Float(kAnalog, "GEN_SCALE", 1.0f);
-    p.Group(kTrial, "TRIAL");
-    p.Int16s(kTrial, "ACTUAL_START_FIELD", {1, 0});
-    p.Int16s(kTrial, "ACTUAL_END_FIELD", {static_cast<std::uint16_t>(frames & 0xffff), static_cast<std::uint16_t>(frames >> 16)});
-    return p.Finish();
-  };
-  std::string section = parameters(0);
-  auto dataBlock = static_cast<std::uint16_t>(2 + section.size() / kBlock);
-  section = parameters(dataBlock);
-
+std::string Utf8(std::string_view text) {
+  if (ValidUtf8(text)) return std::string(text);
   std::string out;
-  out += '\x02', out += static_cast<char>(kKey);
-  PutLe(out, static_cast<std::uint16_t>(labels.size()));
-  PutLe(out, std::uint16_t{0});  // analog values per frame
-  PutLe(out, std::uint16_t{1});  // first frame
-  PutLe(out, shortFrames);       // last frame (TRIAL:ACTUAL_END_FIELD beyond 65535)
-  PutLe(out, std::uint16_t{0});  // largest gap filled
-  PutLe(out, -1.0f);             // scale: negative for float data
-  PutLe(out, dataBlock);
-  PutLe(out, std::uint16_t{0});  // analog samples per frame
-  PutLe(out, rate);
-  Pad(out);
-  out += section;
-  out.reserve(out.size() + static_cast<std::size_t>(frames) * labels.size() * 16 + kBlock);
-  for (std::size_t f = 0; f < frames; ++f)
-    for (const Track& track : take.tracks) {
-      bool seen = track.keys[0][f] && track.keys[1][f] && track.keys[2][f];
-      for (int axis = 0; axis < 3; ++axis) {
-        double value = seen ? track.values[axis][f] : 0.0;
-        if (!(std::fabs(value) <= std::numeric_limits<float>::max()))
-          Refuse("the marker '" + track.subject + ":" + track.marker + "' holds " + NumberText(value) + ", too large for a C3D file");
-        PutLe(out, static_cast<float>(value));
-      }
-      PutLe(out, seen ? 0.0f : -1.0f);
-    }
-  Pad(out);
+  for (char c : text) {
+    auto byte = static_cast<unsigned char>(c);
+    if (byte < 0x80) out += c;
+    else out += static_cast<char>(0xc0 | byte >> 6), out += static_cast<char>(0x80 | (byte & 0x3f));
+  }
   return out;
 }
 
-struct C3dParameter {
-  std::int8_t group;
-  std::string name;
-  std::int8_t type;  // -1 text, 1 byte, 2 16-bit integer, 4 float
-  std::vector<std::size_t> dims;
-  std::string_view data;
-};
+// A file's text as an object name: UTF-8, with '/' and control characters (which names cannot hold)
+// turned into '_'.
+std::string NameText(std::string_view text) {
+  std::string name = Utf8(text);
+  for (char& c : name)
+    if (c == '/' || static_cast<unsigned char>(c) < 0x20) c = '_';
+  return name;
+}
 
-class C3dReader {
-public:
-  explicit C3dReader(std::string_view file) : file_(file) {}
+// `base`, or where `taken` says it is taken, the first of base_2, base_3, ... that is not.
+template <class Taken>
+std::string Unique(const std::string& base, Taken taken) {
+  if (!taken(base)) return base;
+  for (int k = 2;; ++k)
+    if (std::string name = base + "_" + std::to_string(k); !taken(name)) return name;
+}
 
-  [[noreturn]] static void Fail(const std::string& why) { Refuse("the C3D file is damaged: " + why); }
-
-  Take Read() {
-    if (file_.size() < kBlock || static_cast<std::uint8_t>(file_[1]) != kKey) Fail("it does not start with a C3D header");
-    ReadParameters();
-    std::size_t points = GetLe<std::uint16_t>(file_, 2);
-    std::size_t analogs = GetLe<std::uint16_t>(file_, 4);
-    std::int64_t first = GetLe<std::uint16_t>(file_, 6), last = GetLe<std::uint16_t>(file_, 8);
-    float scale = GetLe<float>(file_, 12);
-    std::size_t dataBlock = GetLe<std::uint16_t>(file_, 16);
-    float rate = GetLe<float>(file_, 20);
-    if (const C3dParameter* start = Find("TRIAL", "ACTUAL_START_FIELD"); start && start->type == 2 && Count(*start) == 2)
-      first = Word(*start, 0) + 65536 * Word(*start, 1);
-    if (const C3dParameter* end = Find("TRIAL", "ACTUAL_END_FIELD"); end && end->type == 2 && Count(*end) == 2)
-      last = std::max(last, Word(*end, 0) + 65536 * Word(*end, 1));
-    if (last < first) Fail("its last frame comes before its first");
-    if (last - first + 1 > kMaxFrames) Fail("it has more than " + std::to_string(kMaxFrames) + " frames");
-    if (!std::isfinite(scale) || scale == 0) Fail("its scale factor is not a number other than 0");
-    if (!std::isfinite(rate) || rate <= 0) Fail("its frame rate is not a positive number");
-    if (dataBlock < 2) Fail("its data start in block " + std::to_string(dataBlock));
-
-    Take take;
-    take.frames = last - first + 1;
-    take.rate = rate;
-    std::vector<std::string> labels = Labels(points);
-    bool floats = scale < 0;
-    std::size_t word = floats ? 4 : 2;
-    std::size_t frameBytes = (points * 4 + analogs) * word;
-    std::size_t start = (dataBlock - 1) * kBlock;
-    auto frames = static_cast<std::size_t>(take.frames);
-    if (start > file_.size() || (file_.size() - start) / std::max<std::size_t>(frameBytes, 1) < (frameBytes ? frames : 0))
-      Fail("it ends before its last frame");
-
-    take.tracks.resize(points);
-    for (std::size_t p = 0; p < points; ++p) {
-      NameTrack(take.tracks[p], labels[p]);
-      for (int axis = 0; axis < 3; ++axis) take.tracks[p].values[axis].assign(frames, 0), take.tracks[p].keys[axis].assign(frames, false);
+// The names of the file's points. A label is split at its last colon (SUBJECT:MARKER; without one,
+// or with nothing before it, the subject is Unlabeled). A point whose label or marker part is blank
+// is named Point<N>, N its number in the file. A name the file has already given gets the first free
+// suffix _2, _3, ...; labelled points are named first, in the file's order, so the first occurrence
+// of a label keeps it. Every renamed point is reported in `log`.
+void NamePoints(Take& take, const std::vector<c3d::Point>& points, std::vector<std::string>& log) {
+  std::set<std::pair<std::string_view, std::string_view>> taken;  // the names of take.tracks given so far
+  for (int pass = 0; pass < 2; ++pass)
+    for (std::size_t p = 0; p < points.size(); ++p) {
+      std::string label = NameText(points[p].label);
+      std::size_t colon = label.rfind(':');
+      std::string subject = colon == std::string::npos || colon == 0 ? std::string(kUnlabeled) : label.substr(0, colon);
+      std::string marker = colon == std::string::npos ? label : label.substr(colon + 1);
+      if (marker.empty() != (pass == 1)) continue;
+      std::string base = marker.empty() ? "Point" + std::to_string(p + 1) : marker;
+      marker = Unique(base, [&](const std::string& name) { return taken.contains({subject, name}); });
+      take.tracks[p].subject = subject, take.tracks[p].marker = marker;
+      taken.insert({take.tracks[p].subject, take.tracks[p].marker});
+      std::string named = " is named '" + subject + ":" + marker + "'";
+      if (pass == 1) log.push_back("point " + std::to_string(p + 1) + " has no label: it" + named);
+      else if (marker != base) log.push_back("the label '" + label + "' is repeated: its point " + std::to_string(p + 1) + named);
     }
-    for (std::size_t f = 0; f < frames; ++f)
-      for (std::size_t p = 0; p < points; ++p) {
-        std::size_t at = start + f * frameBytes + p * 4 * word;
-        double xyz[3];
-        double residual;
-        for (int axis = 0; axis < 3; ++axis)
-          xyz[axis] = floats ? GetLe<float>(file_, at + static_cast<std::size_t>(axis) * word)
-                             : GetLe<std::int16_t>(file_, at + static_cast<std::size_t>(axis) * word) * static_cast<double>(scale);
-        residual = floats ? GetLe<float>(file_, at + 3 * word) : GetLe<std::int16_t>(file_, at + 3 * word);
-        bool seen = residual >= 0 && std::isfinite(xyz[0]) && std::isfinite(xyz[1]) && std::isfinite(xyz[2]);
-        if (!seen) continue;
-        for (int axis = 0; axis < 3; ++axis) take.tracks[p].values[axis][f] = xyz[axis], take.tracks[p].keys[axis][f] = true;
-      }
-    return take;
-  }
+}
 
-private:
-  void ReadParameters() {
-    std::size_t block = static_cast<std::uint8_t>(file_[0]);
-    if (block < 2) Fail("its parameters start in block " + std::to_string(block));
-    std::size_t start = (block - 1) * kBlock;
-    if (start + 4 > file_.size()) Fail("it ends before its parameters");
-    std::uint8_t processor = static_cast<std::uint8_t>(file_[start + 3]);
-    if (processor != kIntel) Fail("only the Intel form is read, not processor type " + std::to_string(processor));
-    std::size_t end = std::min(file_.size(), start + kBlock * static_cast<std::uint8_t>(file_[start + 2]));
-    std::size_t at = start + 4;
-    while (at + 2 <= end) {
-      auto length = static_cast<std::int8_t>(file_[at]);
-      auto id = static_cast<std::int8_t>(file_[at + 1]);
-      if (length == 0 || id == 0) break;
-      std::size_t nameLength = static_cast<std::size_t>(std::abs(length));
-      if (at + 2 + nameLength + 2 > end) Fail("a parameter runs past the parameter section");
-      std::string name(file_.substr(at + 2, nameLength));
-      for (char& c : name) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
-      std::size_t offsetAt = at + 2 + nameLength;
-      std::size_t offset = GetLe<std::uint16_t>(file_, offsetAt);
-      std::size_t next = offset == 0 ? end : offsetAt + offset;
-      if (next > end || next < offsetAt + 2) Fail("a parameter's length points outside the parameter section");
-      std::string_view body = file_.substr(offsetAt + 2, next - offsetAt - 2);
-      if (id < 0) groups_[-id] = name;
-      else parameters_.push_back(Parameter(id, std::move(name), body));
-      if (offset == 0) break;
-      at = next;
-    }
+// The file's points as tracks, seen where all three coordinates hold keys.
+Take TracksOf(c3d::Take& file, std::vector<std::string>& log) {
+  Take take;
+  take.frames = static_cast<std::int64_t>(file.frames);
+  take.rate = file.rate;
+  take.tracks.resize(file.points.size());
+  NamePoints(take, file.points, log);
+  for (std::size_t p = 0; p < file.points.size(); ++p) {
+    for (int axis = 0; axis < 3; ++axis) take.tracks[p].values[axis] = std::move(file.points[p].axis[axis]);
+    take.tracks[p].keys[0] = take.tracks[p].keys[1] = file.points[p].seen;
+    take.tracks[p].keys[2] = std::move(file.points[p].seen);
   }
+  return take;
+}
 
-  static C3dParameter Parameter(std::int8_t group, std::string name, std::string_view body) {
-    if (body.size() < 2) Fail("the parameter '" + name + "' is cut short");
-    C3dParameter p{group, std::move(name), static_cast<std::int8_t>(body[0]), {}, {}};
-    if (p.type != -1 && p.type != 1 && p.type != 2 && p.type != 4) Fail("the parameter '" + p.name + "' has an unknown type");
-    std::size_t dims = static_cast<std::uint8_t>(body[1]);
-    if (body.size() < 2 + dims) Fail("the parameter '" + p.name + "' is cut short");
-    std::size_t size = static_cast<std::size_t>(std::abs(p.type));
-    for (std::size_t i = 0; i < dims; ++i) {
-      p.dims.push_back(static_cast<std::uint8_t>(body[2 + i]));
-      size *= p.dims.back();
-    }
-    if (body.size() < 2 + dims + size) Fail("the parameter '" + p.name + "' is cut short");
-    p.data = body.substr(2 + dims, size);
-    return p;
+std::string FloatText(double value) {
+  char text[32];
+  return std::string(text, std::to_chars(text, text + sizeof text, static_cast<float>(value)).ptr);
+}
+
+// The file's analog channels become the take's, each an Analog object under the root named by its
+// label (Analog<N> where it has none; a name taken under the root gets a suffix as points do), and
+// the file's other groups are kept. A merge keeps the take's own when the file brings no channels;
+// the take's channels are dropped (DropAnalog) before the file's markers come in.
+bool ReplacesAnalog(const c3d::Take& file, bool merge) { return !merge || !file.analog.empty(); }
+
+void DropAnalog(Scene& scene) {
+  for (Object* old : scene.OfType(scene.Root(), "Analog")) scene.Remove(old->id);
+}
+
+void AddAnalog(Scene& scene, c3d::Take& file, std::vector<std::string>& log) {
+  scene.analog = {file.samples, file.generalScale, {}};
+  scene.fileGroups = std::move(file.groups);
+  for (std::size_t c = 0; c < file.analog.size(); ++c) {
+    c3d::Analog& channel = file.analog[c];
+    std::string base = channel.label.empty() ? "Analog" + std::to_string(c + 1) : NameText(channel.label);
+    std::string name = Unique(base, [&](const std::string& n) { return scene.Child(scene.Root(), n) != nullptr; });
+    if (name != base) log.push_back("the analog channel '" + base + "' (" + std::to_string(c + 1) + ") is named '" + name + "'");
+    Object& o = scene.Add(scene.root, "Analog", name);
+    o.FindAttribute("Description")->value = Utf8(channel.description);
+    o.FindAttribute("Unit")->value = Utf8(channel.unit);
+    o.FindAttribute("Scale")->value = *Canonical(ValueType::Float, FloatText(channel.scale));
+    o.FindAttribute("Offset")->value = *Canonical(ValueType::Float, FloatText(channel.offset));
+    scene.analog.column[o.id] = channel.column;
   }
+}
 
-  const C3dParameter* Find(std::string_view group, std::string_view name) const {
-    for (const C3dParameter& p : parameters_) {
-      auto g = groups_.find(p.group);
-      if (g != groups_.end() && g->second == group && p.name == name) return &p;
-    }
-    return nullptr;
+// The take as a C3D file holds it: its markers, its analog channels in the order of the tree, and the
+// kept groups.
+c3d::Take C3dOf(Scene& scene, Take& take) {
+  c3d::Take file;
+  file.rate = take.rate;
+  file.frames = static_cast<std::size_t>(take.frames);
+  for (Track& track : take.tracks) {
+    c3d::Point& point = file.points.emplace_back();
+    point.label = track.subject + ":" + track.marker;
+    point.seen.resize(file.frames);
+    for (std::size_t f = 0; f < file.frames; ++f) point.seen[f] = track.keys[0][f] && track.keys[1][f] && track.keys[2][f];
+    for (int axis = 0; axis < 3; ++axis) point.axis[axis] = std::move(track.values[axis]);
   }
-  static std::size_t Count(const C3dParameter& p) { return p.data.size() / static_cast<std::size_t>(std::abs(p.type)); }
-  static std::int64_t Word(const C3dParameter& p, std::size_t i) { return GetLe<std::uint16_t>(p.data, 2 * i); }
-
-  // POINT:LABELS, LABELS2, ... with their padding blanks taken off.
-  std::vector<std::string> Labels(std::size_t points) const {
-    std::vector<std::string> labels;
-    for (int part = 1; labels.size() < points; ++part) {
-      const C3dParameter* p = Find("POINT", part == 1 ? std::string("LABELS") : "LABELS" + std::to_string(part));
-      if (!p) Fail("it names " + std::to_string(labels.size()) + " of its " + std::to_string(points) + " points");
-      if (p->type != -1 || p->dims.size() != 2 || p->dims[0] == 0 || p->dims[1] == 0) Fail("its point labels are not a list of texts");
-      for (std::size_t i = 0; i < p->dims[1] && labels.size() < points; ++i) {
-        std::string_view label = p->data.substr(i * p->dims[0], p->dims[0]);
-        std::size_t kept = label.find_last_not_of(std::string_view(" \0", 2));
-        labels.emplace_back(label.substr(0, kept == std::string_view::npos ? 0 : kept + 1));
-      }
-    }
-    return labels;
-  }
-
-  std::string_view file_;
-  std::map<int, std::string> groups_;
-  std::vector<C3dParameter> parameters_;
-};
+  file.samples = scene.analog.data;
+  file.generalScale = scene.analog.generalScale;
+  for (Object* o : scene.OfType(scene.Root(), "Analog"))
+    file.analog.push_back({o->name, o->Text("Description"), o->Text("Unit"), ParseDouble(o->Text("Scale")).value_or(1),
+                           ParseDouble(o->Text("Offset")).value_or(0), scene.analog.column.at(o->id)});
+  file.groups = scene.fileGroups;
+  return file;
+}
 
 // ---- The commands ---------------------------------------------------------------------------------
 
@@ -564,7 +401,10 @@ void ImportFile(Context& context, Reader& in, Writer&) {
   Format format = FormatOf(path, formatName);
   std::string bytes;
   if (!platform::ReadFile(FilePlace(path), bytes, kMaxImport)) Refuse("cannot read the file '" + path + "'");
-  Take take = format == Format::Csv ? ReadCsv(bytes) : C3dReader(bytes).Read();
+  std::vector<std::string> log;
+  c3d::Take file;
+  if (format == Format::C3d) file = c3d::Read(std::move(bytes)), log = file.notes;
+  Take take = format == Format::Csv ? ReadCsv(bytes) : TracksOf(file, log);
   bytes.clear();
 
   if (merge && take.frames != context.scene.frames)
@@ -573,13 +413,17 @@ void ImportFile(Context& context, Reader& in, Writer&) {
   Scene next = merge ? context.scene : EmptyScene(static_cast<int>(take.frames));
   if (!merge) {
     double rate = format == Format::Csv ? context.scene.timeline.rate : take.rate;
-    if (!SupportedFrameRate(rate)) Refuse("the file's frame rate " + NumberText(rate) + " is not one the timeline supports");
+    if (!TimelineHolds(rate)) Refuse("the file's frame rate " + NumberText(rate) + " is not one the timeline supports");
     next.Root().name = StemOf(path);
-    next.timeline.rate = static_cast<int>(rate);
+    next.timeline.rate = rate;
     next.timeline.standard = context.scene.timeline.standard;
   }
+  bool analog = format == Format::C3d && ReplacesAnalog(file, merge);
+  if (analog) DropAnalog(next);
   Apply(next, take);
+  if (analog) AddAnalog(next, file, log);
   context.scene = std::move(next);
+  for (const std::string& line : log) LogLine("warning", "ImportFile '" + path + "': " + line);
 }
 
 void ExportFile(Context& context, Reader& in, Writer&) {
@@ -588,7 +432,7 @@ void ExportFile(Context& context, Reader& in, Writer&) {
   if (path.empty()) Refuse("a file path cannot be empty");
   Format format = FormatOf(path, formatName);
   Take take = TakeOf(context.scene);
-  std::string bytes = format == Format::Csv ? WriteCsv(take) : WriteC3d(take);
+  std::string bytes = format == Format::Csv ? WriteCsv(take) : c3d::Write(C3dOf(context.scene, take));
   if (!platform::WriteFileAtomically(FilePlace(path), bytes)) Refuse("cannot write the file '" + path + "'");
 }
 

@@ -56,7 +56,8 @@ void PutObjects(Scene& scene, Writer& out, const std::vector<ObjectId>& ids) {
   out.PutTexts(ids, [&](ObjectId id) -> std::string_view { return scene.objects.at(id).type; });
 }
 
-// An attribute's value as text: Name, Type and WorldTranslation are read from the object itself.
+// An attribute's value as text: Name, Type and WorldTranslation are read from the object itself, an
+// Analog object's Rate (samples a second) and Samples (its count) from the take.
 std::string ValueOf(Scene& scene, Object& o, const Attribute& a) {
   if (a.name == "Name") return o.name;
   if (a.name == "Type") return o.type;
@@ -64,6 +65,9 @@ std::string ValueOf(Scene& scene, Object& o, const Attribute& a) {
     std::vector<double> w = scene.WorldTranslation(o.id);
     return NumberText(w[0]) + "," + NumberText(w[1]) + "," + NumberText(w[2]);
   }
+  std::size_t perFrame = scene.analog.data.samplesPerFrame();
+  if (a.name == "Rate") return NumberText(scene.timeline.rate * static_cast<double>(perFrame));
+  if (a.name == "Samples") return std::to_string(static_cast<std::size_t>(scene.frames) * perFrame);
   return a.value;
 }
 
@@ -134,6 +138,7 @@ void SceneCreateObject(Context& context, Reader& in, Writer& out) {
   ObjectId parentId = in.Get<std::uint64_t>();
   NoOptions("SceneCreateObject", in.Text());
   if (!KnownType(type) || type == "Scene") Refuse("no object type named '" + type + "' can be created");
+  if (type == "Analog") Refuse("an Analog object comes only with the analog channels of an imported C3D file");
   if (std::string bad = BadName(name); !bad.empty()) Refuse(bad);
   Object& parent = ObjectOf(scene, parentId);
   CheckPlace(scene, parent, type, name, nullptr);

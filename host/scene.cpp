@@ -122,6 +122,42 @@ bool SupportedFrameRate(double rate) {
   return rate >= 1 && rate <= kMaxFrameRate && rate == std::floor(rate) && kTicksPerSecond % static_cast<std::uint64_t>(rate) == 0;
 }
 
+bool TimelineHolds(double rate) { return rate >= kMinTakeRate && rate <= kMaxTakeRate; }
+
+namespace {
+
+// ceil(n x 2^shift / m), exactly: long division, one bit of the shift at a time.
+std::uint64_t CeilShiftedQuotient(std::uint64_t n, int shift, std::uint64_t m) {
+  std::uint64_t q = n / m, r = n % m;
+  for (int i = 0; i < shift; ++i) {
+    q <<= 1, r <<= 1;
+    if (r >= m) ++q, r -= m;
+  }
+  return q + (r != 0);
+}
+
+}  // namespace
+
+// The rate is m x 2^e with m odd, so (F - 1) x kTicksPerSecond / rate = (F - 1) x kTicksPerSecond x
+// 2^-e / m: a whole-number division (e >= 0) or a shifted one (e < 0), both exact in 64 bits for
+// the rates and frame counts a take may have.
+std::uint64_t Timeline::TicksOf(int frame) const {
+  std::uint64_t n = static_cast<std::uint64_t>(frame - 1) * kTicksPerSecond;
+  int e;
+  auto m = static_cast<std::uint64_t>(std::ldexp(std::frexp(rate, &e), 53));
+  for (e -= 53; m != 0 && m % 2 == 0; m /= 2) ++e;
+  if (e >= 0) return (n + (m << e) - 1) / (m << e);
+  return CeilShiftedQuotient(n, -e, m);
+}
+
+int Timeline::FrameAt(std::uint64_t time) const {
+  double estimate = std::floor(static_cast<double>(time) * rate / static_cast<double>(kTicksPerSecond));
+  int frame = static_cast<int>(std::min(estimate, 1e9)) + 1;
+  while (frame > 1 && TicksOf(frame) > time) --frame;
+  while (TicksOf(frame + 1) <= time) ++frame;
+  return frame;
+}
+
 std::uint64_t Timeline::Now() const {
   if (!playing) return ticks;
   auto elapsed = std::chrono::duration_cast<std::chrono::nanoseconds>(std::chrono::steady_clock::now() - playedFrom).count();
@@ -142,8 +178,14 @@ bool KnownType(std::string_view type) {
   return std::find(std::begin(kObjectTypes), std::end(kObjectTypes), type) != std::end(kObjectTypes);
 }
 
+bool Computed(std::string_view attribute) {
+  for (std::string_view name : {"Name", "Type", "WorldTranslation", "Rate", "Samples"})
+    if (attribute == name) return true;
+  return false;
+}
+
 bool MayContain(std::string_view parent, std::string_view child) {
-  if (parent == "Scene") return child == "Subject" || child == "Camera" || child == "Clip" || child == "Null";
+  if (parent == "Scene") return child == "Subject" || child == "Camera" || child == "Clip" || child == "Null" || child == "Analog";
   if (parent == "Subject") return child == "Marker" || child == "Bone" || child == "Constraint";
   if (parent == "Bone") return child == "Bone" || child == "Null";
   if (parent == "Null") return child == "Null";
@@ -249,6 +291,13 @@ Object& Scene::Add(ObjectId parent, std::string type, std::string name) {
     attribute("ConstraintType", ValueType::String, true, "Point");
   } else if (o.type == "Clip") {
     attribute("Description", ValueType::String, true, "");
+  } else if (o.type == "Analog") {
+    attribute("Description", ValueType::String, true, "");
+    attribute("Unit", ValueType::String, true, "");
+    attribute("Scale", ValueType::Float, false, "1");
+    attribute("Offset", ValueType::Float, false, "0");
+    attribute("Rate", ValueType::Float, false, "");
+    attribute("Samples", ValueType::Int, false, "");
   }
   ObjectId id = o.id;
   objects.at(parent).children.push_back(id);
@@ -268,6 +317,10 @@ void Scene::Remove(ObjectId id) {
   auto& siblings = objects.at(objects.at(id).parent).children;
   siblings.erase(std::find(siblings.begin(), siblings.end(), id));
   for (ObjectId each : gone) {
+    if (objects.at(each).type == "Analog") {
+      analog.column.erase(each);
+      std::erase_if(fileGroups, [](const c3d::Group& g) { return g.name == "FORCE_PLATFORM"; });
+    }
     objects.erase(each);
     selection.erase(std::remove(selection.begin(), selection.end(), each), selection.end());
     if (activeClip == each) activeClip = 0;

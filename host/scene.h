@@ -7,7 +7,9 @@
 // channels and parameters have ids from the same counter.
 //
 // A marker's trajectory is its channels X, Y and Z: a frame where all three hold a key is a frame
-// where the marker was seen. A subject's parameters of kind Number are its subject parameters.
+// where the marker was seen. A subject's parameters of kind Number are its subject parameters. An
+// analog channel (a force plate's, an EMG electrode's) is an Analog object under the root; its
+// samples are kept beside the tree (Scene::analog), since they are not one value a frame.
 #pragma once
 
 #include <chrono>
@@ -18,6 +20,7 @@
 #include <unordered_map>
 #include <vector>
 
+#include "host/c3d.h"
 #include "host/settings.h"
 
 namespace client3::host {
@@ -101,13 +104,18 @@ struct Object {
 // Time: ticks, seconds and frames are views of one current time. Frame 1 is at time 0.
 inline constexpr std::uint64_t kTicksPerSecond = 705'600'000;
 inline constexpr int kMaxFrameRate = 10'000;
-// Whether `rate` frames per second can be played with a whole number of ticks per frame.
+// Whether `rate` frames per second can be played with a whole number of ticks per frame: the rates
+// that TimelineSetFrameRate takes.
 bool SupportedFrameRate(double rate);
+// Whether the timeline can hold `rate` at all: any rate from 0.001 to 1,000,000 frames per second
+// (a take imported from a file keeps its own).
+inline constexpr double kMinTakeRate = 1e-3, kMaxTakeRate = 1e6;
+bool TimelineHolds(double rate);
 // The time-code standards, by name.
 inline constexpr std::string_view kTimeCodeStandards[] = {"Film", "PAL", "NTSC", "NTSCDrop", "HD50", "HD60"};
 
 struct Timeline {
-  int rate = 100;
+  double rate = 100;
   std::uint64_t ticks = 0;  // the current time while stopped, the time playback started from while playing
   int playStart = 1, playEnd = 1, animStart = 1, animEnd = 1;
   std::string standard = "PAL";
@@ -115,14 +123,25 @@ struct Timeline {
   std::chrono::steady_clock::time_point playedFrom;
   std::vector<bool> selected;  // frames of the take that are selected
 
-  std::uint64_t TicksPerFrame() const { return kTicksPerSecond / static_cast<std::uint64_t>(rate); }
   // The current time: while playing, moved on by the time that has passed, frame by frame through
   // the play range and round again.
   std::uint64_t Now() const;
-  int FrameAt(std::uint64_t time) const { return static_cast<int>(time / TicksPerFrame()) + 1; }
-  std::uint64_t TicksOf(int frame) const { return static_cast<std::uint64_t>(frame - 1) * TicksPerFrame(); }
+  // Frame F starts at the first whole tick at or after its exact time, (F - 1) x kTicksPerSecond /
+  // rate, worked out exactly; a time lies in the last frame that starts at or before it. For a rate
+  // that divides kTicksPerSecond every frame is the same whole number of ticks long.
+  std::uint64_t TicksOf(int frame) const;
+  int FrameAt(std::uint64_t time) const;
   // Sets the current time (playback, if on, goes on from there).
   void Set(std::uint64_t time);
+};
+
+// The samples of the take's analog channels: each channel's Analog object has its column of `data`
+// (the file's own numbers, samplesPerFrame a frame). A channel's physical values are (sample - its
+// Offset) x its Scale x generalScale.
+struct AnalogSamples {
+  c3d::AnalogData data;
+  double generalScale = 1;
+  std::unordered_map<ObjectId, std::size_t> column;
 };
 
 struct Scene {
@@ -134,6 +153,10 @@ struct Scene {
   ObjectId activeClip = 0;
   Timeline timeline;
   Settings settings;  // the processing stages' settings, kept with the scene
+  AnalogSamples analog;
+  // The groups of an imported C3D file that the application does not use (force platforms,
+  // subjects, events, ...), written back when the take is exported.
+  std::vector<c3d::Group> fileGroups;
 
   explicit Scene(int frames = 1, std::string name = "Untitled");
 
@@ -153,7 +176,8 @@ struct Scene {
   Object& Add(ObjectId parent, std::string type, std::string name);
   // Adds a channel with no keys to an object; the caller has checked the name.
   Channel& AddChannel(Object& object, std::string name);
-  // Removes an object with its descendants (never the root).
+  // Removes an object with its descendants (never the root); an Analog object's samples go with it,
+  // and with them the file's FORCE_PLATFORM group, whose channel numbers no longer hold.
   void Remove(ObjectId id);
   // Sum of the Translation attributes from the root down to the object.
   std::vector<double> WorldTranslation(ObjectId id);
@@ -165,8 +189,11 @@ struct Scene {
 };
 
 // The types of objects, and which may be the child of which.
-inline constexpr std::string_view kObjectTypes[] = {"Scene", "Subject", "Marker", "Bone", "Constraint", "Camera", "Clip", "Null"};
+inline constexpr std::string_view kObjectTypes[] = {"Scene", "Subject", "Marker", "Bone", "Constraint", "Camera", "Clip", "Null", "Analog"};
 bool KnownType(std::string_view type);
+// Whether an attribute's value is worked out from the object and the scene rather than stored:
+// Name, Type, WorldTranslation, and an Analog object's Rate and Samples.
+bool Computed(std::string_view attribute);
 bool MayContain(std::string_view parentType, std::string_view childType);
 // Why `name` cannot name an object; empty when it can.
 std::string BadName(std::string_view name);

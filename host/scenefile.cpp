@@ -6,11 +6,16 @@
 //   ranges FIRST-LAST,...            (selected frame ranges; "-" for none)
 //   settings RECORD VALUE...         (one line per settings record, values in field order;
 //                                     a record without a line keeps its defaults)
+//   analog SAMPLES_PER_FRAME GENERAL_SCALE  (only with analog channels)
+//   group NAME DESCRIPTION           (a kept group of an imported C3D file, then its parameters:)
+//   groupparameter NAME DESCRIPTION TYPE DIMENSIONS DATA  (DIMENSIONS separated by commas, "-" for
+//                                     none; DATA the bytes of the Intel form)
 //   object INDEX PARENT TYPE NAME    (the root is object 0 with parent "-"; parents come first)
 //   attribute NAME VALUE             (of the object above)
 //   parameter NAME KIND VALUE DEFAULT UNIT REQUIRED
 //   channel NAME DEFAULT VALUES FLAGS  (values of every frame separated by commas; one flag a
 //                                       frame: 0 no key, 1 key, 2 selected key)
+//   samples VALUES                   (of an Analog object: its samples separated by commas)
 //   selection INDEX...
 //   active INDEX                     (the active clip; "-" for none)
 //   end
@@ -22,9 +27,11 @@
 #include <algorithm>
 #include <cctype>
 #include <charconv>
+#include <cmath>
 #include <map>
 
 #include "host/failure.h"
+#include "host/text.h"
 
 namespace client3::host {
 
@@ -70,6 +77,98 @@ std::string Decode(std::string_view word, std::size_t line) {
   return out;
 }
 
+// A float in its shortest form that reads back exactly as a float.
+std::string FloatText(float value) {
+  char text[32];
+  return std::string(text, std::to_chars(text, text + sizeof text, value).ptr);
+}
+
+std::string Joined(const auto& values, auto text) {
+  std::string out;
+  for (const auto& v : values) {
+    if (!out.empty()) out += ',';
+    out += text(v);
+  }
+  return out.empty() ? "-" : out;
+}
+
+// The numbers of a list separated by commas; "-" is none.
+template <class T>
+std::vector<T> NumbersOf(std::string_view list, std::size_t line) {
+  std::vector<T> out;
+  for (std::size_t from = 0; list != "-" && from <= list.size();) {
+    std::size_t comma = std::min(list.find(',', from), list.size());
+    auto value = ParseNumber<T>(list.substr(from, comma - from));
+    if (!value || (std::is_floating_point_v<T> && !std::isfinite(*value))) Bad(line, "a bad number in a list");
+    out.push_back(*value);
+    from = comma + 1;
+  }
+  return out;
+}
+
+std::string Groups(const std::vector<c3d::Group>& groups) {
+  std::string out;
+  for (const c3d::Group& g : groups) {
+    out += "group " + Encode(g.name) + " " + Encode(g.description) + "\n";
+    for (const c3d::Parameter& p : g.parameters)
+      out += "groupparameter " + Encode(p.name) + " " + Encode(p.description) + " " + std::to_string(p.type) + " " +
+             Joined(p.dims, [](int d) { return std::to_string(d); }) + " " + Encode(p.data) + "\n";
+  }
+  return out;
+}
+
+std::vector<c3d::Group> ReadGroups(const std::vector<std::vector<std::string_view>>& lines, std::size_t& at) {
+  std::vector<c3d::Group> groups;
+  for (; at < lines.size() && (lines[at][0] == "group" || lines[at][0] == "groupparameter"); ++at) {
+    const auto& w = lines[at];
+    if (w[0] == "group" && w.size() == 3) {
+      groups.push_back({Decode(w[1], at + 1), Decode(w[2], at + 1), {}});
+      const c3d::Group& g = groups.back();
+      if (!c3d::ValidName(g.name) || c3d::OwnGroup(g.name) || g.description.size() > 255) Bad(at + 1, "a bad group");
+      continue;
+    }
+    if (w.size() != 6 || groups.empty()) Bad(at + 1, "a group parameter out of place");
+    c3d::Parameter p{Decode(w[1], at + 1), Decode(w[2], at + 1), 0, {}, Decode(w[5], at + 1)};
+    auto type = ParseInt(w[3]);
+    if (!type || (*type != -1 && *type != 1 && *type != 2 && *type != 4)) Bad(at + 1, "a bad parameter type");
+    p.type = static_cast<std::int8_t>(*type);
+    std::size_t size = static_cast<std::size_t>(std::abs(*type));
+    for (int d : NumbersOf<int>(w[4], at + 1)) {
+      if (d < 0 || d > 255) Bad(at + 1, "a bad dimension");
+      p.dims.push_back(static_cast<std::uint8_t>(d)), size *= static_cast<std::size_t>(d);
+    }
+    if (size != p.data.size() || !c3d::ValidName(p.name) || p.description.size() > 255) Bad(at + 1, "a bad group parameter");
+    groups.back().parameters.push_back(std::move(p));
+  }
+  return groups;
+}
+
+// The analog channels' samples as the lines give them, before they become the scene's.
+struct AnalogLines {
+  std::size_t samplesPerFrame = 0;
+  double generalScale = 1;
+  std::vector<std::vector<float>> channels;
+};
+
+// The line `analog SAMPLES_PER_FRAME GENERAL_SCALE`, where there is one.
+AnalogLines ReadAnalog(const std::vector<std::vector<std::string_view>>& lines, std::size_t& at) {
+  if (at >= lines.size() || lines[at][0] != "analog") return {};
+  const auto& w = lines[at++];
+  auto perFrame = w.size() == 3 ? ParseInt(w[1]) : std::nullopt;
+  auto general = w.size() == 3 ? ParseDouble(w[2]) : std::nullopt;
+  if (!perFrame || *perFrame < 1 || *perFrame > 65535 || !general) Bad(at, "a bad 'analog' line");
+  return {static_cast<std::size_t>(*perFrame), *general, {}};
+}
+
+// An Analog object's samples: one list of samplesPerFrame for every frame.
+void ReadSamples(std::string_view list, std::size_t line, Scene& scene, const Object& object, AnalogLines& analog) {
+  if (object.type != "Analog" || scene.analog.column.contains(object.id) || analog.samplesPerFrame == 0) Bad(line, "samples out of place");
+  scene.analog.column[object.id] = analog.channels.size();
+  analog.channels.push_back(NumbersOf<float>(list, line));
+  if (analog.channels.back().size() != static_cast<std::size_t>(scene.frames) * analog.samplesPerFrame)
+    Bad(line, "an analog channel without its samples for every frame");
+}
+
 std::string Ranges(const std::vector<bool>& selected) {
   std::string out;
   for (std::size_t f = 0; f < selected.size(); ++f) {
@@ -88,7 +187,7 @@ std::string Ranges(const std::vector<bool>& selected) {
 std::string WriteScene(Scene& scene) {
   const Timeline& t = scene.timeline;
   std::string out = std::string(kMagic) + " 1\nframes " + std::to_string(scene.frames) + "\n";
-  out += "timeline " + std::to_string(t.rate) + " " + std::to_string(t.Now()) + " " + std::to_string(t.playStart) + " " +
+  out += "timeline " + NumberText(t.rate) + " " + std::to_string(t.Now()) + " " + std::to_string(t.playStart) + " " +
          std::to_string(t.playEnd) + " " + std::to_string(t.animStart) + " " + std::to_string(t.animEnd) + " " + Encode(t.standard) + "\n";
   out.append("ranges ").append(Ranges(t.selected)).append(1, '\n');
   for (std::size_t r = 0; r < kRecordCount; ++r) {
@@ -96,6 +195,9 @@ std::string WriteScene(Scene& scene) {
     for (const std::string& value : scene.settings.values[r]) out.append(1, ' ').append(Encode(value));
     out += "\n";
   }
+  if (scene.analog.data.samplesPerFrame() > 0)
+    out += "analog " + std::to_string(scene.analog.data.samplesPerFrame()) + " " + NumberText(scene.analog.generalScale) + "\n";
+  out += Groups(scene.fileGroups);
   std::map<ObjectId, std::size_t> index;
   std::vector<ObjectId> order{scene.root};
   for (ObjectId id : scene.Descendants(scene.root)) order.push_back(id);
@@ -105,7 +207,7 @@ std::string WriteScene(Scene& scene) {
     out += "object " + std::to_string(index[id]) + " " + (id == scene.root ? "-" : std::to_string(index.at(o.parent))) + " " +
            Encode(o.type) + " " + Encode(o.name) + "\n";
     for (const Attribute& a : o.attributes)
-      if (a.name != "Name" && a.name != "Type" && a.name != "WorldTranslation") out += "attribute " + Encode(a.name) + " " + Encode(a.value) + "\n";
+      if (!Computed(a.name)) out += "attribute " + Encode(a.name) + " " + Encode(a.value) + "\n";
     for (const Parameter& p : o.parameters)
       out += "parameter " + Encode(p.name) + " " + std::to_string(static_cast<int>(p.kind)) + " " + Encode(p.value) + " " +
              Encode(p.fallback) + " " + Encode(p.unit) + " " + (p.required ? "1" : "0") + "\n";
@@ -119,6 +221,8 @@ std::string WriteScene(Scene& scene) {
       for (std::size_t f = 0; f < c.keys.size(); ++f) out += c.selected[f] ? '2' : c.keys[f] ? '1' : '0';
       out += "\n";
     }
+    if (auto column = scene.analog.column.find(id); column != scene.analog.column.end())
+      out += "samples " + Joined(scene.analog.data.Channel(column->second), FloatText) + "\n";
   }
   out += "selection";
   for (ObjectId id : scene.selection) out.append(1, ' ').append(std::to_string(index.at(id)));
@@ -163,8 +267,9 @@ Scene ReadScene(std::string_view text) {
   int frames = number(next("frames", 1, 1)[1], 1, kMaxFrames);
   auto& tl = next("timeline", 7, 7);
   Timeline t;
-  t.rate = number(tl[1], 1, kMaxFrameRate);
-  if (!SupportedFrameRate(t.rate)) Bad(at, "an unsupported frame rate");
+  auto rate = ParseDouble(tl[1]);
+  if (!rate || !TimelineHolds(*rate)) Bad(at, "an unsupported frame rate");
+  t.rate = *rate;
   std::uint64_t ticks = 0;
   if (auto [end, error] = std::from_chars(tl[2].data(), tl[2].data() + tl[2].size(), ticks);
       tl[2].empty() || error != std::errc() || end != tl[2].data() + tl[2].size())
@@ -201,6 +306,9 @@ Scene ReadScene(std::string_view text) {
   Scene scene(frames);
   scene.timeline = t;
   scene.settings = settings;
+  AnalogLines analog = ReadAnalog(lines, at);
+  scene.analog.generalScale = analog.generalScale;
+  scene.fileGroups = ReadGroups(lines, at);
   std::vector<ObjectId> ids;
   while (at < lines.size() && lines[at][0] == "object") {
     auto& o = next("object", 4, 4);
@@ -219,13 +327,16 @@ Scene ReadScene(std::string_view text) {
     }
     ids.push_back(object->id);
     std::vector<std::string> seenChannels;
-    while (at < lines.size() && (lines[at][0] == "attribute" || lines[at][0] == "parameter" || lines[at][0] == "channel")) {
+    while (at < lines.size() && (lines[at][0] == "attribute" || lines[at][0] == "parameter" || lines[at][0] == "channel" ||
+                                 lines[at][0] == "samples")) {
       std::string_view kind = lines[at][0];
-      if (kind == "attribute") {
+      if (kind == "samples") {
+        ReadSamples(next("samples", 1, 1)[1], at, scene, *object, analog);
+      } else if (kind == "attribute") {
         auto& a = next("attribute", 2, 2);
         std::string aname = Decode(a[1], at);
         Attribute* attribute = object->FindAttribute(aname);
-        if (!attribute || aname == "Name" || aname == "Type" || aname == "WorldTranslation") Bad(at, "an unknown attribute '" + aname + "'");
+        if (!attribute || Computed(aname)) Bad(at, "an unknown attribute '" + aname + "'");
         std::optional<std::string> value = Canonical(attribute->type, Decode(a[2], at));
         if (!value) Bad(at, "a bad value of attribute '" + aname + "'");
         if (aname == "ConstraintType" && std::find(std::begin(kConstraintTypes), std::end(kConstraintTypes), *value) == std::end(kConstraintTypes))
@@ -272,6 +383,10 @@ Scene ReadScene(std::string_view text) {
     }
   }
   if (ids.empty()) Bad(at + 1, "no scene object");
+  for (ObjectId id : ids)
+    if (scene.objects.at(id).type == "Analog" && !scene.analog.column.contains(id)) Bad(at + 1, "an analog channel without samples");
+  if (analog.samplesPerFrame > 0)
+    scene.analog.data = c3d::AnalogData::FromChannels(analog.channels, analog.samplesPerFrame, static_cast<std::size_t>(frames));
   auto& selection = next("selection", 0, ids.size());
   for (std::size_t i = 1; i < selection.size(); ++i) {
     ObjectId id = ids[static_cast<std::size_t>(number(selection[i], 1, static_cast<long>(ids.size()) - 1))];

@@ -24,7 +24,7 @@ void TimelineGetTicks(Context& context, Reader&, Writer& out) { out.Put(context.
 void TimelineSetTicks(Context& context, Reader& in, Writer&) {
   Timeline& t = context.scene.timeline;
   std::uint64_t ticks = in.Get<std::uint64_t>();
-  std::uint64_t end = t.TicksOf(context.scene.frames) + t.TicksPerFrame() - 1;
+  std::uint64_t end = t.TicksOf(context.scene.frames + 1) - 1;
   if (ticks > end)
     throw Failure{BadFrame, std::to_string(ticks) + " ticks is past the end of the take (" + std::to_string(end) + ")"};
   t.Set(ticks);
@@ -96,7 +96,7 @@ void TimelineSetFrameRate(Context& context, Reader& in, Writer&) {
     Refuse("a frame rate must be a whole number of frames per second from 1 to 10000 that divides " +
            std::to_string(kTicksPerSecond) + " (" + NumberText(rate) + " does not)");
   std::uint64_t now = t.Now();
-  t.rate = static_cast<int>(rate);
+  t.rate = rate;
   t.Set(std::min(now, t.TicksOf(context.scene.frames)));
 }
 

@@ -96,3 +96,12 @@ def test_bench_load_quick_prints_its_table():
     for kind in ("write", "read", "trajectory", "count", "markers", "subjects", "all"):
         assert any(line.split()[:1] == [kind] and len(line.split()) == 7 for line in lines), (kind, done.stdout)
     assert "writes lost: 0; wrong reads: 0" in done.stdout
+
+
+def test_bench_c3d_quick_prints_its_table():
+    done = subprocess.run([sys.executable, os.path.join(BENCHMARKS, "bench_c3d.py"), "--quick"],
+                          capture_output=True, text=True, timeout=600)
+    assert done.returncode == 0, done.stderr
+    rows = [line.strip("|").split("|") for line in done.stdout.splitlines() if line.startswith("| sample_")]
+    assert len(rows) == 2 and all(len(row) == 7 and float(row[-1]) > 0 for row in rows), done.stdout
+    assert sum(line.startswith("goal: ") for line in done.stdout.splitlines()) == 1, done.stdout

@@ -110,7 +110,7 @@ def damaged_files(text):
     """Ways a scene file can be wrong: cut short at many places, and lines changed to hostile values."""
     lines = text.split("\n")
     yield from (text[:cut] for cut in (0, 10, len(text) // 3, len(text) // 2, len(text) - 5, len(text) - 1))
-    swaps = {"frames 50": "frames 999999999", "timeline 100 ": "timeline 11 ", "ranges -": "ranges 40-3",
+    swaps = {"frames 50": "frames 999999999", "timeline 100 ": "timeline 0 ", "ranges -": "ranges 40-3",
              "active ": "active 1", "selection": "selection 99999", "end": "end\nmore"}
     for old, new in swaps.items():
         index = next(i for i, line in enumerate(lines) if line.startswith(old))

@@ -185,26 +185,31 @@ def c3d_header(file, **fields):
     return bytes(data)
 
 
+def c3d_parameter(data, name, value):
+    """A C3D file with the value of the (first) parameter `name` changed."""
+    at = data.index(name) + len(name) + 2  # past the offset word: type, dimensions, value
+    at += 2 + data[at + 1]
+    return data[:at] + value + data[at + len(value):]
+
+
 def damaged_c3d(data):
     """A good C3D file broken in the ways a file can be: cut short, its header or parameters wrong."""
     parameters = data.index(b"POINT") - 6  # the parameter section's start
     labels = data.index(b"LABELS")
-    yield from (data[:cut] for cut in (0, 100, 511, parameters + 40, len(data) // 2, len(data) - 600))
+    yield from (data[:cut] for cut in (0, 100, 511, parameters + 40, len(data) // 2, len(data) - 300, len(data) - 600))
     yield c3d_header(data, key=0x51)
     yield c3d_header(data, parameters=0)
     yield c3d_header(data, parameters=200)
-    yield c3d_header(data, points=60000)
-    start = data.index(b"ACTUAL_START_FIELD") + 23
-    yield data[:start] + struct.pack("<HH", 100, 0) + data[start + 4:]  # starts after it ends
-    yield c3d_header(data, data=1)
     yield c3d_header(data, data=60000)
-    yield c3d_header(data, rate=float("nan"))
-    yield c3d_header(data, scale=0.0)
-    yield data[:parameters + 3] + bytes([85]) + data[parameters + 4:]  # DEC processor
-    yield data[:labels + 6] + b"\xff\x7f" + data[labels + 8:]  # offset past the section
-    yield data[:labels] + b"LABELX" + data[labels + 6:]  # the labels missing
-    end = data.index(b"ACTUAL_END_FIELD") + 21
-    yield data[:end] + struct.pack("<HH", 0xffff, 0x7fff) + data[end + 4:]  # two thousand million frames
+    yield c3d_parameter(c3d_header(data, data=1), b"DATA_START", struct.pack("<H", 1))  # no start after the parameters
+    yield c3d_parameter(c3d_header(data, rate=float("nan")), b"RATE", struct.pack("<f", -50))
+    yield c3d_parameter(c3d_header(data, scale=0.0), b"SCALE", struct.pack("<f", float("inf")))
+    yield data[:parameters + 3] + bytes([83]) + data[parameters + 4:]  # no processor type
+    yield data[:labels + 2] + b"\x07" + data[labels + 3:]  # a name with a control character
+    yield data[:labels + 6] + b"\x01\x00" + data[labels + 8:]  # an offset into the item itself
+    yield data[:labels + 8] + b"\x03" + data[labels + 9:]  # an unknown type
+    yield data[:labels + 10] + b"\xff" + data[labels + 11:]  # labels longer than their parameter
+    yield c3d_parameter(data, b"ACTUAL_END_FIELD", struct.pack("<HH", 0xffff, 0x7fff))  # two thousand million frames
 
 
 def damaged_csv(text):
@@ -247,12 +252,15 @@ def test_damaged_files_are_refused_and_the_scene_is_kept(app, tmp_path, kind):
 
 def test_refusals_name_the_reason_and_keep_the_scene(app, tmp_path):
     write_c3d(tmp_path / "short.c3d", ["A:B"], [[(1, 2, 3)]] * 10)
-    write_c3d(tmp_path / "ntsc.c3d", ["A:B"], [[(1, 2, 3)]] * 50, rate=29.97)
+    write_c3d(tmp_path / "fast.c3d", ["A:B"], [[(1, 2, 3)]] * 50, rate=2e6)
+    app.ExportFile(str(tmp_path / "inches.c3d"), "")
+    (tmp_path / "inches.c3d").write_bytes(c3d_parameter((tmp_path / "inches.c3d").read_bytes(), b"UNITS", b"in"))
     write_c3d(tmp_path / "camera.c3d", ["Camera1:B"], [[(1, 2, 3)]] * 50)
     before = state(app)
     cases = [
         ("ImportFile", str(tmp_path / "short.c3d"), "", True), "the file has 10 frames and the take 50: a merge needs the same number",
-        ("ImportFile", str(tmp_path / "ntsc.c3d"), "", False), f"the file's frame rate {np.float32(29.97).item()!r} is not one the timeline supports",
+        ("ImportFile", str(tmp_path / "fast.c3d"), "", False), "the file's frame rate 2e+06 is not one the timeline supports",
+        ("ImportFile", str(tmp_path / "inches.c3d"), "", False), "the C3D file's points are in 'in', not in mm, cm or m",
         ("ImportFile", str(tmp_path / "camera.c3d"), "", True), "the point 'Camera1:B' cannot be imported: 'Camera1' is a Camera",
         ("ImportFile", str(tmp_path / "none.c3d"), "", True), f"cannot read the file '{tmp_path / 'none.c3d'}'",
         ("ImportFile", str(tmp_path / "short.c3d"), "trc", True), f"no file format 'trc' (csv or c3d) for '{tmp_path / 'short.c3d'}'",
