@@ -1,5 +1,5 @@
 """C3D files through the application against the pure-Python reader, on every real file of
-tests/data/c3d: ImportFile (replacing the scene) and ExportFile as a script calls them, and the `c3d`
+data/c3d: ImportFile (replacing the scene) and ExportFile as a script calls them, and the `c3d`
 package reading the same file, every frame with its analog samples.
 
     python benchmarks/bench_c3d.py            # best of 7 runs of each
@@ -23,7 +23,7 @@ import c3d
 import Client3
 from Client3.testing import running_host
 
-CORPUS = Path(__file__).resolve().parent.parent / "tests" / "data" / "c3d"
+CORPUS = Path(__file__).resolve().parent.parent / "data" / "c3d"
 GOAL = 10.0
 
 

@@ -11,7 +11,7 @@ import numpy as np
 
 import c3d
 
-CORPUS = Path(__file__).parent / "data" / "c3d"
+CORPUS = Path(__file__).resolve().parent.parent / "data" / "c3d"
 OWN_GROUPS = ("POINT", "ANALOG", "TRIAL")
 UNITS = {"": 1.0, "mm": 1.0, "cm": 10.0, "m": 1000.0}
 

@@ -1,5 +1,5 @@
 """Real C3D files through the application, against the independent reader (the `c3d` package): every
-corpus file in tests/data/c3d imported and exported again, markers in millimetres, analog channels
+corpus file in data/c3d imported and exported again, markers in millimetres, analog channels
 and the groups the application does not use; hand-made files for what the corpus lacks."""
 import functools
 import math
