@@ -809,8 +809,22 @@ def _method_doc(command: str, parameters: tuple[str, ...], kinds: tuple[str, ...
     fields = _interface.FIELDS.get(answer, ()) if answer != RECORD_BASE else ()
     given = ", ".join(f"{field} ({kind})" for field, kind in fields)
     text += f" Answers {answer}" + (f" with {given}." if given else ".")
-    text += " Failures: NotConnected, or ApplicationError with the application's reason, in Result and ResultString."
-    return _wrap(text)
+    return _wrap(f"{text} {_failures(command)}")
+
+
+# The inputs that name a time of the take: a time outside it is answered with InvalidFrameNumber.
+_TIME_INPUTS = frozenset({"Frame", "Start", "End", "Ticks", "Seconds"})
+
+
+def _failures(command: str) -> str:
+    """The failures a command's record can report, in Result and ResultString."""
+    failures = ["ApplicationError with the application's reason"]
+    if any(name in _TIME_INPUTS for name, _ in _COMMANDS[command][1]):
+        failures.append("InvalidFrameNumber for a time outside the take")
+    if command == "GetTrajectoryAtFrame":
+        failures.append("ExpectedOneFrame when the reply holds another number of frames")
+    failures += ["NotConnected when there is no connection", "RequestTimedOut when no answer comes in time"]
+    return f"Failures, in Result and ResultString: {', '.join(failures)}."
 
 
 def _client_methods(owner: str) -> dict[str, object]:

@@ -85,6 +85,8 @@ DESCRIPTIONS = {name: description for name, description, _, _ in _catalogue.COMM
     ("OfflineSetSolvingSettings", "Takes settings (the Output_SolvingSettings that OfflineGetSolvingSettings answers"),
     ("LoadFile", "Takes path (str, bytes or os.PathLike)."),
     ("Connect", "Connects to the application at `address`"),
+    ("TimelineSelectRange", "InvalidFrameNumber for a time outside the take"),
+    ("GetTrajectoryAtFrame", "ExpectedOneFrame when the reply holds another number of frames"),
 ])
 def test_help_shows_the_parameters_and_a_doc(method, says):
     shown = pydoc.render_doc(getattr(CLIENT, method), renderer=pydoc.plaintext)
