@@ -17,10 +17,9 @@
 #include <string_view>
 #include <thread>
 
-#include "host/access.h"
-#include "host/scenefile.h"
-#include "host/server.h"
-#include "host/text.h"
+#include "host/files/scenefile.h"
+#include "host/files/access.h"
+#include "host/server/server.h"
 #include "platform/net.h"
 
 using namespace client3::host;
@@ -47,37 +46,14 @@ bool ParseInt(std::string_view text, int& out, int least, int most) {
   return true;
 }
 
-// KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, announce,
-// frames=N, stage-delay=MS, exit=N.
-bool ParseFault(std::string_view fault, Options& options) {
-  std::string command;
-  if (auto at = fault.find('@'); at != std::string_view::npos) command = fault.substr(at + 1), fault = fault.substr(0, at);
-  std::string_view kind = fault.substr(0, fault.find('='));
-  std::string_view value = kind.size() < fault.size() ? fault.substr(kind.size() + 1) : std::string_view();
-  int number = 0;
-  if (!value.empty() && !ParseInt(value, number, -2147483647, 2147483647)) return false;
-  if (kind == "frames") return number >= 0 && (options.faults.framesPerFrame = number, true);
-  if (kind == "stage-delay") return number >= 0 && (options.faults.stageDelay = number, true);
-  if (kind == "exit") return number > 0 && (options.exitAt = number, options.exitCommand = command, true);
-  static const std::pair<std::string_view, ReplyFault::Kind> kinds[] = {
-      {"delay", ReplyFault::Delay}, {"garbage", ReplyFault::Garbage}, {"close", ReplyFault::Close},
-      {"text", ReplyFault::Text},   {"status", ReplyFault::Status},   {"oversize", ReplyFault::Oversize},
-      {"announce", ReplyFault::Announce}};
-  for (auto [name, k] : kinds)
-    if (kind == name) return options.replyFaults.push_back({k, number, command}), true;
-  return false;
-}
-
 // An address that only this machine reaches: "localhost", "::1" or a dotted 127.x.y.z.
 bool IsLoopback(std::string_view host) {
   if (host == "localhost" || host == "::1") return true;
-  int parts = 0, value = 0;
-  for (std::size_t at = 0; at <= host.size(); ++parts) {
-    std::size_t dot = std::min(host.find('.', at), host.size());
-    if (!ParseInt(host.substr(at, dot - at), value, 0, 255) || (parts == 0 && value != 127)) return false;
-    at = dot + 1;
-  }
-  return parts == 4;
+  std::vector<std::string> parts = SplitList(host, '.');
+  int value = 0;
+  for (std::size_t i = 0; i < parts.size(); ++i)
+    if (!ParseInt(parts[i], value, i == 0 ? 127 : 0, i == 0 ? 127 : 255)) return false;
+  return parts.size() == 4;
 }
 
 int Usage(const char* problem) {
@@ -138,7 +114,7 @@ int main(int argc, char** argv) {
     else if (option == "--files")
       files.emplace_back(value);
     else if (option == "--fault") {
-      if (!ParseFault(value, options)) return Usage(("unknown fault '" + std::string(value) + "'").c_str());
+      if (!options.faults.Add(value)) return Usage(("unknown fault '" + std::string(value) + "'").c_str());
     } else {
       return Usage(("unknown option " + std::string(option)).c_str());
     }
