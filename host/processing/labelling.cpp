@@ -26,14 +26,12 @@ struct Label {
 std::optional<Label> LabelOf(Object& marker) {
   Parameter* p = marker.FindParameter(kTemplate);
   if (!p || p->kind != ParameterKind::Text) return std::nullopt;
-  std::string_view text = p->value;
+  std::vector<std::string> parts = SplitList(p->value);
   double v[4];
-  for (double& each : v) {
-    std::size_t comma = std::min(text.find(','), text.size());
-    std::optional<double> number = ParseDouble(text.substr(0, comma));
+  for (std::size_t i = 0; i < 4; ++i) {
+    std::optional<double> number = i < parts.size() ? ParseDouble(parts[i]) : std::nullopt;
     if (!number) return std::nullopt;
-    each = *number;
-    text.remove_prefix(std::min(comma + 1, text.size()));
+    v[i] = *number;
   }
   return Label{{v[0], v[1], v[2]}, v[3]};
 }
@@ -88,6 +86,122 @@ struct Assignment {
   }
 };
 
+// The per-axis median of `points` (at least one).
+Point Median(const std::vector<Point>& points) {
+  Point median;
+  std::vector<double> axis(points.size());
+  for (std::size_t a = 0; a < 3; ++a) {
+    for (std::size_t i = 0; i < points.size(); ++i) axis[i] = points[i][a];
+    std::nth_element(axis.begin(), axis.begin() + static_cast<std::ptrdiff_t>(axis.size() / 2), axis.end());
+    median[a] = axis[axis.size() / 2];
+  }
+  return median;
+}
+
+// Labels a subject's frames one after another (see AutoLabel). The markers that receive points are
+// those of the labels, in the labels' order, then the unlabelled ones.
+class Labeller {
+ public:
+  Labeller(std::vector<Track> markers, std::vector<Label> labels, std::size_t frames)
+      : markers_(std::move(markers)), labels_(std::move(labels)), results_(markers_.size()) {
+    for (std::size_t i = 0; i < markers_.size(); ++i) {
+      for (int a = 0; a < 3; ++a) results_[i].values[a] = markers_[i].axes[a]->values;
+      results_[i].seen.assign(frames, false);
+    }
+    std::vector<Point> offsets;
+    for (const Label& l : labels_) offsets.push_back(l.offset);
+    middle_ = Median(offsets);
+  }
+
+  // Labels frame `f`.
+  void Frame(std::size_t f) {
+    points_.clear(), from_.clear();
+    for (std::size_t i = 0; i < markers_.size(); ++i)
+      if (markers_[i].Seen(f)) points_.push_back(markers_[i].At(f)), from_.push_back(i);
+    if (points_.empty()) return last_.reset();
+    last_ = Place(last_ ? *last_ : Median(points_) - middle_);
+    Give(f);
+  }
+
+  // The new trajectories, with what was done: the labels given, those given a point that another
+  // marker held, and the points dropped.
+  Outcome Finish() {
+    std::string result = "labelled=" + std::to_string(assigned_) + ",moved=" + std::to_string(moved_) + ",dropped=" + std::to_string(dropped_);
+    std::string summary = Count(assigned_, "label") + " given, " + std::to_string(moved_) + " of them to a point another marker held; " +
+                          Count(dropped_, "point") + " dropped";
+    return {result, summary, [markers = markers_, results = std::move(results_)] {
+              for (std::size_t i = 0; i < markers.size(); ++i)
+                for (int a = 0; a < 3; ++a) {
+                  Channel& c = *markers[i].axes[a];
+                  c.values = results[i].values[a];
+                  for (std::size_t f = 0; f < c.keys.size(); ++f)
+                    if (results[i].seen[f]) c.keys[f] = true;
+                    else c.DeleteKey(f);
+                }
+            }};
+  }
+
+ private:
+  // Where the pairs of the last assignment put the template, one place per label that took a point.
+  std::vector<Point> Places() const {
+    std::vector<Point> places;
+    for (std::size_t l = 0; l < labels_.size(); ++l)
+      if (int p = assignment_.taken[l]; p >= 0) places.push_back(points_[static_cast<std::size_t>(p)] - labels_[l].offset);
+    return places;
+  }
+
+  // The three passes from `start`: pairing regardless of reach, then within reach at the median and
+  // at the mean of where the pairs before put the template. Returns where it was placed last.
+  Point Place(const Point& start) {
+    assignment_.Assign(labels_, start, true, points_);
+    Point centre = Median(Places());
+    assignment_.Assign(labels_, centre, false, points_);
+    std::vector<Point> places = Places();
+    if (places.empty()) return centre;
+    Point sum{};
+    for (const Point& p : places) sum = sum + p;
+    centre = sum * (1.0 / static_cast<double>(places.size()));
+    assignment_.Assign(labels_, centre, false, points_);
+    return centre;
+  }
+
+  // Each label's marker takes the label's point; the points no label took go to the unlabelled
+  // markers in order, and those left over are dropped.
+  void Give(std::size_t f) {
+    used_.assign(points_.size(), false);
+    auto put = [&](std::size_t marker, std::size_t point) {
+      for (int a = 0; a < 3; ++a) results_[marker].values[a][f] = points_[point][static_cast<std::size_t>(a)];
+      results_[marker].seen[f] = true;
+      used_[point] = true;
+    };
+    for (std::size_t l = 0; l < labels_.size(); ++l)
+      if (int p = assignment_.taken[l]; p >= 0) put(l, static_cast<std::size_t>(p)), ++assigned_, moved_ += from_[static_cast<std::size_t>(p)] != l;
+    std::size_t next = labels_.size();
+    for (std::size_t p = 0; p < points_.size(); ++p) {
+      if (used_[p]) continue;
+      if (next < markers_.size()) put(next++, p);
+      else ++dropped_;
+    }
+  }
+
+  // A marker's new trajectory, from its old one: a frame that loses its point keeps its values.
+  struct Trajectory {
+    std::vector<double> values[3];
+    std::vector<bool> seen;
+  };
+
+  std::vector<Track> markers_;
+  std::vector<Label> labels_;
+  std::vector<Trajectory> results_;
+  Point middle_;              // the median of the labels' offsets
+  std::optional<Point> last_;  // where the template was placed at the frame before
+  std::vector<Point> points_;  // the frame's points ...
+  std::vector<std::size_t> from_;  // ... and the markers they came from
+  Assignment assignment_;
+  std::vector<bool> used_;
+  std::size_t assigned_ = 0, moved_ = 0, dropped_ = 0;
+};
+
 }  // namespace
 
 // The template from the take as it is labelled: over the frames where every marker is seen, the mean
@@ -140,107 +254,26 @@ Outcome LabelROM(Scene& scene, Object& subject, Progress& progress) {
 // labelled or not. Three passes place the template: where it was placed at the frame before (at the
 // first frame, or after one without points: the points' median less the offsets' median, per axis),
 // pairing labels and points regardless of reach; at the median (per axis) of where those pairs put
-// it, now within reach; and at the mean of where the second pass's pairs put it. A label without a point in reach
-// leaves its marker unseen at that frame. The points no label takes go to the unlabelled markers, in order;
-// those that find no unlabelled marker are dropped.
+// it, now within reach; and at the mean of where the second pass's pairs put it. A label without a
+// point in reach leaves its marker unseen at that frame. The points no label takes go to the
+// unlabelled markers, in order; those that find no unlabelled marker are dropped.
 Outcome AutoLabel(Scene& scene, Object& subject, Progress& progress) {
-  std::vector<Track> tracks = TracksOf(scene, subject), labelled, unlabelled;
+  std::vector<Track> markers, unlabelled;
   std::vector<Label> labels;
-  for (const Track& t : tracks) {
-    if (std::optional<Label> label = LabelOf(*t.marker)) labels.push_back(*label), labelled.push_back(t);
+  for (const Track& t : TracksOf(scene, subject)) {
+    if (std::optional<Label> label = LabelOf(*t.marker)) labels.push_back(*label), markers.push_back(t);
     else unlabelled.push_back(t);
   }
   if (labels.empty()) Refuse(Quoted(subject) + " has no label template: 'OfflineLabelROM' must run first");
-  std::vector<Track> order = labelled;  // the markers that receive points: labelled first, then the rest
-  order.insert(order.end(), unlabelled.begin(), unlabelled.end());
+  markers.insert(markers.end(), unlabelled.begin(), unlabelled.end());
   auto frames = static_cast<std::size_t>(scene.frames);
-  // The new trajectories, starting from the old ones; a frame that loses its point keeps its values.
-  struct Result {
-    std::vector<double> values[3];
-    std::vector<bool> seen;
-  };
-  std::vector<Result> results(order.size());
-  for (std::size_t i = 0; i < order.size(); ++i) {
-    for (int a = 0; a < 3; ++a) results[i].values[a] = order[i].axes[a]->values;
-    results[i].seen.assign(frames, false);
-  }
-  std::vector<double> axis;
-  auto median = [&axis] {
-    std::nth_element(axis.begin(), axis.begin() + static_cast<std::ptrdiff_t>(axis.size() / 2), axis.end());
-    return axis[axis.size() / 2];
-  };
-  Point middle;  // the offsets' median
-  for (std::size_t a = 0; a < 3; ++a) {
-    axis.clear();
-    for (const Label& l : labels) axis.push_back(l.offset[a]);
-    middle[a] = median();
-  }
-  std::optional<Point> last;  // where the template was placed at the frame before
-  std::vector<Point> points;
-  std::vector<std::size_t> from;
-  Assignment assignment;
-  const std::vector<int>& taken = assignment.taken;
-  std::vector<bool> used;
-  std::size_t assigned = 0, moved = 0, dropped = 0;
+  Labeller labeller(std::move(markers), std::move(labels), frames);
   for (std::size_t f = 0; f < frames; ++f) {
     progress.At(f);
-    points.clear(), from.clear();
-    for (std::size_t i = 0; i < order.size(); ++i)
-      if (order[i].Seen(f)) points.push_back(order[i].At(f)), from.push_back(i);
-    if (points.empty()) {
-      last.reset();
-      continue;
-    }
-    Point centre;
-    for (std::size_t a = 0; a < 3 && !last; ++a) {
-      axis.clear();
-      for (const Point& p : points) axis.push_back(p[a]);
-      centre[a] = median() - middle[a];
-    }
-    assignment.Assign(labels, last ? *last : centre, true, points);
-    for (std::size_t a = 0; a < 3; ++a) {
-      axis.clear();
-      for (std::size_t l = 0; l < labels.size(); ++l)
-        if (taken[l] >= 0) axis.push_back(points[static_cast<std::size_t>(taken[l])][a] - labels[l].offset[a]);
-      centre[a] = median();
-    }
-    assignment.Assign(labels, centre, false, points);
-    Point sum{};
-    std::size_t count = 0;
-    for (std::size_t l = 0; l < labels.size(); ++l)
-      if (taken[l] >= 0) sum = sum + (points[static_cast<std::size_t>(taken[l])] - labels[l].offset), ++count;
-    if (count) assignment.Assign(labels, centre = sum * (1.0 / static_cast<double>(count)), false, points);
-    last = centre;
-    used.assign(points.size(), false);
-    auto put = [&](std::size_t marker, std::size_t point) {
-      for (int a = 0; a < 3; ++a) results[marker].values[a][f] = points[point][static_cast<std::size_t>(a)];
-      results[marker].seen[f] = true;
-      used[point] = true;
-    };
-    for (std::size_t l = 0; l < labels.size(); ++l)
-      if (taken[l] >= 0) put(l, static_cast<std::size_t>(taken[l])), ++assigned, moved += from[static_cast<std::size_t>(taken[l])] != l;
-    std::size_t next = labels.size();
-    for (std::size_t p = 0; p < points.size(); ++p) {
-      if (used[p]) continue;
-      if (next < order.size()) put(next++, p);
-      else ++dropped;
-    }
+    labeller.Frame(f);
   }
   progress.Done();
-  std::string result = "labelled=" + std::to_string(assigned) + ",moved=" + std::to_string(moved) + ",dropped=" + std::to_string(dropped);
-  std::string summary = Count(assigned, "label") + " given, " + std::to_string(moved) + " of them to a point another marker held; " +
-                        Count(dropped, "point") + " dropped";
-  return {result, summary, [order, results = std::move(results)] {
-            for (std::size_t i = 0; i < order.size(); ++i) {
-              for (int a = 0; a < 3; ++a) {
-                Channel& c = *order[i].axes[a];
-                c.values = results[i].values[a];
-                for (std::size_t f = 0; f < c.keys.size(); ++f)
-                  if (results[i].seen[f]) c.keys[f] = true;
-                  else c.DeleteKey(f);
-              }
-            }
-          }};
+  return labeller.Finish();
 }
 
 // Labelling-subject calibration: each constraint's Offset becomes the mean offset of its marker from

@@ -69,7 +69,6 @@ void Cubic(Fill& fill, std::size_t frames) {
 
 }  // namespace
 
-
 Outcome FixOcclusion(Scene& scene, Object& subject, Progress& progress) {
   const Settings& settings = scene.settings;
   double longest = std::floor(settings.Number(Record::OcclusionFixing, "TransitionTime") * scene.timeline.rate + 1e-9);
@@ -82,22 +81,15 @@ Outcome FixOcclusion(Scene& scene, Object& subject, Progress& progress) {
   for (std::size_t i = 0; i < tracks->size(); ++i) {
     progress.At(i);
     const Track& t = (*tracks)[i];
-    for (std::size_t f = 0; f < frames;) {
-      if (t.Seen(f)) {
-        ++f;
+    for (auto [first, end] : Runs(frames, [&](std::size_t f) { return !t.Seen(f); })) {
+      if (first == 0 || end == frames || static_cast<double>(end - first) > longest) {
+        ++(first == 0 || end == frames ? ends : longer);
         continue;
       }
-      std::size_t end = f;
-      while (end < frames && !t.Seen(end)) ++end;
-      if (f == 0 || end == frames || static_cast<double>(end - f) > longest) {
-        ++(f == 0 || end == frames ? ends : longer), f = end;
-        continue;
-      }
-      Fill fill{&t, f, end, {}};
+      Fill fill{&t, first, end, {}};
       if (FromNeighbour(*tracks, fill)) ++rigid;
       else Cubic(fill, frames);
       fills.push_back(std::move(fill));
-      f = end;
     }
   }
   progress.Done();
