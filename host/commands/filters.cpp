@@ -12,18 +12,16 @@ namespace {
 // The channels a filter command names and the frames it may use: the selected ones, or all.
 FilterTarget TargetOf(Scene& scene, protocol::Reader& in) {
   Object& o = ObjectOf(scene, in.Get<std::uint64_t>());
-  ObjectId channelId = in.Get<std::uint64_t>();
+  Channel* named = &ChannelOf(o, in.Get<std::uint64_t>());
   std::string_view component = in.Text();
   bool selectedOnly = in.Get<bool>();
-  Channel* named = o.FindChannel(channelId);
-  if (!named) Refuse("object '" + o.name + "' has no channel with id " + std::to_string(channelId));
   FilterTarget target;
   if (component.empty()) {
     target.channels = {named};
   } else if (component == "XYZ") {
     for (std::string_view axis : {"X", "Y", "Z"}) {
       Channel* c = o.FindChannel(axis);
-      if (!c) Refuse("object '" + o.name + "' has no channel '" + std::string(axis) + "' for component 'XYZ'");
+      if (!c) Refuse("object " + std::to_string(o.id) + " has no channel named '" + std::string(axis) + "', which component 'XYZ' needs");
       target.channels.push_back(c);
     }
     if (named != target.channels[0] && named != target.channels[1] && named != target.channels[2])

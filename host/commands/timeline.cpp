@@ -52,7 +52,8 @@ CLIENT3_HANDLER(TimelineGetSecs, Read) {
 CLIENT3_HANDLER(TimelineSetSecs, Write) {
   Timeline& t = context.scene.timeline;
   float seconds = in.Get<float>();
-  if (!std::isfinite(seconds) || seconds < 0) Refuse("a time in seconds must be 0 or more");
+  if (!std::isfinite(seconds)) Refuse("a time in seconds must be a finite number, not " + NumberText(seconds));
+  if (seconds < 0) throw Failure{BadFrame, std::to_string(seconds) + " seconds is before the start of the take"};
   double frame = std::round(static_cast<double>(seconds) * t.rate) + 1;
   if (frame > context.scene.frames)
     throw Failure{BadFrame, std::to_string(seconds) + " seconds is past the end of the take"};
