@@ -40,9 +40,9 @@ bool FromNeighbour(const std::vector<Track>& tracks, Fill& fill) {
   return false;
 }
 
-// Cubic Hermite interpolation between the frames beside the gap, with the slopes of the data there:
-// from the two frames further out where both are seen (second-order differences), from one where
-// only that one is, else the straight line's slope.
+// Cubic Hermite interpolation between the frames beside the gap, b and a, with the slopes of the
+// data there: at b, (3 x[b] - 4 x[b-1] + x[b-2]) / 2 where b-1 and b-2 are seen, x[b] - x[b-1]
+// where only b-1 is, else the straight line's (x[a] - x[b]) / (a - b); at a likewise, forwards.
 void Cubic(Fill& fill, std::size_t frames) {
   const Track& t = *fill.track;
   std::size_t before = fill.first - 1, after = fill.end;
