@@ -4,8 +4,8 @@
 //   frames 1000
 //   timeline RATE TICKS PLAY_START PLAY_END ANIM_START ANIM_END STANDARD
 //   ranges FIRST-LAST,...            (selected frame ranges; "-" for none)
-//   settings RECORD VALUE...         (one line per settings record, values in field order;
-//                                     a record without a line keeps its defaults)
+//   settings RECORD FIELD=VALUE...   (one line per settings record; a record without a line, and
+//                                     a field a line does not name, keep their defaults)
 //   analog SAMPLES_PER_FRAME GENERAL_SCALE  (only with analog channels)
 //   group NAME DESCRIPTION           (a kept group of an imported C3D file, then its parameters:)
 //   groupparameter NAME DESCRIPTION TYPE DIMENSIONS DATA  (DIMENSIONS separated by commas, "-" for
@@ -217,24 +217,45 @@ std::optional<std::string> SettingText(const protocol::Param& field, const std::
   return ToText(back, field.type);
 }
 
+// The values of a settings line, in canonical text in the order of the record's fields: by name
+// (FIELD=VALUE), a field the line does not name keeping its default; or, in a line without names (as
+// files written before they were named hold them), every field's value in order.
+std::vector<std::string> SettingValues(Lines& lines, Record record, const Words& words) {
+  std::string name(RecordName(record));
+  auto fields = FieldsOf(record);
+  std::vector<std::string> values = Settings().values[static_cast<std::size_t>(record)];
+  bool named = words.size() == 2 || std::any_of(words.begin() + 2, words.end(), [](std::string_view w) { return w.find('=') != w.npos; });
+  if (!named && words.size() - 2 != fields.size()) lines.Bad("the " + name + " settings need " + std::to_string(fields.size()) + " values");
+  std::vector<bool> given(fields.size());
+  for (std::size_t w = 2; w < words.size(); ++w) {
+    std::size_t i = w - 2;
+    std::string_view value = words[w];
+    if (named) {
+      std::size_t equals = value.find('=');
+      if (equals == std::string_view::npos) lines.Bad("a value of the " + name + " settings without its field's name");
+      std::string field = lines.Text(value.substr(0, equals));
+      auto called = [&](const protocol::Param& p) { return p.name == field; };
+      i = static_cast<std::size_t>(std::find_if(fields.begin(), fields.end(), called) - fields.begin());
+      if (i == fields.size()) lines.Bad("the " + name + " settings have no field '" + field + "'");
+      if (given[i]) lines.Bad("the " + name + " setting '" + field + "' is given twice");
+      value = value.substr(equals + 1);
+    }
+    given[i] = true;
+    std::optional<std::string> text = SettingText(fields[i], lines.Text(value));
+    if (!text) lines.Bad("a bad value of " + name + " setting '" + std::string(fields[i].name) + "'");
+    values[i] = *text;
+  }
+  return values;
+}
+
 Settings ReadSettings(Lines& lines) {
   Settings settings;
   while (lines.At("settings")) {
     const Words& words = lines.Take();
     if (words.size() < 2) lines.Bad("'settings' without a record");
-    std::vector<std::string> values;
-    for (std::size_t i = 2; i < words.size(); ++i) values.push_back(lines.Text(words[i]));
-    std::string name(words[1]);
-    std::optional<Record> record = RecordNamed(name);
-    if (!record) lines.Bad("no settings named '" + name + "'");
-    auto fields = FieldsOf(*record);
-    if (values.size() != fields.size()) lines.Bad("the " + name + " settings need " + std::to_string(fields.size()) + " values");
-    for (std::size_t i = 0; i < fields.size(); ++i) {
-      std::optional<std::string> text = SettingText(fields[i], values[i]);
-      if (!text) lines.Bad("a bad value of " + name + " setting '" + std::string(fields[i].name) + "'");
-      values[i] = *text;
-    }
-    if (std::string why = settings.Set(*record, std::move(values)); !why.empty()) lines.Bad(why);
+    std::optional<Record> record = RecordNamed(words[1]);
+    if (!record) lines.Bad("no settings named '" + std::string(words[1]) + "'");
+    if (std::string why = settings.Set(*record, SettingValues(lines, *record, words)); !why.empty()) lines.Bad(why);
   }
   return settings;
 }
@@ -410,7 +431,9 @@ std::string WriteScene(Scene& scene) {
   out.append("ranges ").append(ranges.empty() ? "-" : ranges).append(1, '\n');
   for (std::size_t r = 0; r < kRecordCount; ++r) {
     out.append("settings ").append(RecordName(static_cast<Record>(r)));
-    for (const std::string& value : scene.settings.values[r]) out.append(1, ' ').append(Encode(value));
+    auto fields = FieldsOf(static_cast<Record>(r));
+    for (std::size_t i = 0; i < fields.size(); ++i)
+      out.append(1, ' ').append(Encode(fields[i].name)).append(1, '=').append(Encode(scene.settings.values[r][i]));
     out += "\n";
   }
   if (scene.analog.data.samplesPerFrame() > 0)
