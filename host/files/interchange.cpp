@@ -1,7 +1,3 @@
-// Importing and exporting takes: CSV text (one row per frame, markers only) and C3D files (markers,
-// analog channels and the groups of a C3D file that the application does not use; the format itself
-// is in c3d.cpp).
-//
 // Both formats carry the markers of the scene's subjects, each named `SUBJECT:MARKER`, frame by
 // frame. Files are read whole and checked completely before the scene changes: a damaged,
 // truncated or hostile file is refused and the scene stays as it was.

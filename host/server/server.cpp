@@ -2,7 +2,6 @@
 #include "host/server/server.h"
 
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
 #include <list>
 #include <memory>
