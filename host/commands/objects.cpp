@@ -178,7 +178,7 @@ CLIENT3_HANDLER(ObjectSetParent, Write) {
   o.parent = parent.id;
   if (Attribute* local = o.FindAttribute("Translation"); local && keepWorld) {
     std::vector<double> above = scene.WorldTranslation(parent.id);
-    local->value = NumberText(world[0] - above[0]) + "," + NumberText(world[1] - above[1]) + "," + NumberText(world[2] - above[2]);
+    local->value = VectorText({world[0] - above[0], world[1] - above[1], world[2] - above[2]});
   }
 }
 

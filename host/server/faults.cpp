@@ -16,11 +16,6 @@ using protocol::Writer;
 
 namespace {
 
-void Send(platform::Socket& socket, Writer& frame) {
-  std::string_view bytes = frame.Finish();
-  socket.SendAll(bytes.data(), bytes.size());
-}
-
 // Rewrites a successful reply so that its numeric scalars come as texts that are no numbers.
 void NumbersAsText(Reply& reply, Id id) {
   std::string payload(reply.frame().Finish().substr(protocol::kHeaderSize));

@@ -7,13 +7,20 @@
 #include <string_view>
 
 #include "host/scene/failure.h"
+#include "platform/net.h"
 #include "protocol/wire.h"
 
 namespace client3::host {
 
+// Sends a whole frame.
+inline void Send(platform::Socket& socket, protocol::Writer& frame) {
+  std::string_view bytes = frame.Finish();
+  socket.SendAll(bytes.data(), bytes.size());
+}
+
 class Reply {
  public:
-  // Starts the reply to request `request`: Ok, no message, and the outputs to follow in `outputs()`.
+  // Starts the reply to request `request`: Ok, no message, and the outputs to follow in `frame()`.
   void Start(std::uint32_t request) {
     request_ = request;
     Header(Ok, "");
@@ -27,7 +34,6 @@ class Reply {
     frame_.Append(outputs.data(), outputs.size());
   }
 
-  protocol::Writer& outputs() { return frame_; }
   protocol::Writer& frame() { return frame_; }
   bool ok() const { return ok_; }
   // Where the outputs start in the payload.

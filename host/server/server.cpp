@@ -58,11 +58,6 @@ Got ReadFrame(Socket& socket, std::vector<char>& payload, std::uint32_t most, Cl
   return socket.ReceiveGrowing(payload, size, deadline) == Io::Done ? Got::Frame : Got::Closed;
 }
 
-void Send(Socket& socket, Writer& frame) {
-  std::string_view bytes = frame.Finish();
-  socket.SendAll(bytes.data(), bytes.size());
-}
-
 void SendRefusal(Socket& socket, std::string_view message) {
   Writer frame(protocol::Refusal);
   frame.RawText(message);
@@ -154,7 +149,7 @@ std::optional<Id> Answer(Shared& shared, Context& context, Request request, Read
     context.reading = access == Access::Stage ? &reading : nullptr;
     context.summary.clear();
     shared.options.faults.Starting(id);
-    Run(id, context, in, reply.outputs());
+    Run(id, context, in, reply.frame());
     if (!context.summary.empty()) reply.Say(context.summary);
   } catch (const Failure& failure) {
     reply.Refuse(failure.status, failure.message);
