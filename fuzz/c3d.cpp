@@ -8,8 +8,8 @@
 #include <cstring>
 #include <string_view>
 
-#include "host/c3d.h"
-#include "host/failure.h"
+#include "host/files/c3d.h"
+#include "host/scene/failure.h"
 
 using namespace client3::host;
 

@@ -9,9 +9,10 @@
 #include <cstdint>
 #include <string_view>
 
-#include "host/commands.h"
-#include "host/failure.h"
-#include "host/scene.h"
+#include "host/scene/failure.h"
+#include "host/scene/scene.h"
+#include "host/server/dispatch.h"
+#include "host/server/faults.h"
 
 using namespace client3;
 using protocol::Id;

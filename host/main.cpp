@@ -16,11 +16,12 @@
 #include <string>
 #include <string_view>
 #include <thread>
+#include <type_traits>
+#include <vector>
 
-#include "host/access.h"
-#include "host/scenefile.h"
-#include "host/server.h"
-#include "host/text.h"
+#include "host/files/scenefile.h"
+#include "host/files/access.h"
+#include "host/server/server.h"
 #include "platform/net.h"
 
 using namespace client3::host;
@@ -47,37 +48,14 @@ bool ParseInt(std::string_view text, int& out, int least, int most) {
   return true;
 }
 
-// KIND[=VALUE][@COMMAND], KIND one of delay=MS, garbage, close, text, status=CODE, oversize, announce,
-// frames=N, stage-delay=MS, exit=N.
-bool ParseFault(std::string_view fault, Options& options) {
-  std::string command;
-  if (auto at = fault.find('@'); at != std::string_view::npos) command = fault.substr(at + 1), fault = fault.substr(0, at);
-  std::string_view kind = fault.substr(0, fault.find('='));
-  std::string_view value = kind.size() < fault.size() ? fault.substr(kind.size() + 1) : std::string_view();
-  int number = 0;
-  if (!value.empty() && !ParseInt(value, number, -2147483647, 2147483647)) return false;
-  if (kind == "frames") return number >= 0 && (options.faults.framesPerFrame = number, true);
-  if (kind == "stage-delay") return number >= 0 && (options.faults.stageDelay = number, true);
-  if (kind == "exit") return number > 0 && (options.exitAt = number, options.exitCommand = command, true);
-  static const std::pair<std::string_view, ReplyFault::Kind> kinds[] = {
-      {"delay", ReplyFault::Delay}, {"garbage", ReplyFault::Garbage}, {"close", ReplyFault::Close},
-      {"text", ReplyFault::Text},   {"status", ReplyFault::Status},   {"oversize", ReplyFault::Oversize},
-      {"announce", ReplyFault::Announce}};
-  for (auto [name, k] : kinds)
-    if (kind == name) return options.replyFaults.push_back({k, number, command}), true;
-  return false;
-}
-
 // An address that only this machine reaches: "localhost", "::1" or a dotted 127.x.y.z.
 bool IsLoopback(std::string_view host) {
   if (host == "localhost" || host == "::1") return true;
-  int parts = 0, value = 0;
-  for (std::size_t at = 0; at <= host.size(); ++parts) {
-    std::size_t dot = std::min(host.find('.', at), host.size());
-    if (!ParseInt(host.substr(at, dot - at), value, 0, 255) || (parts == 0 && value != 127)) return false;
-    at = dot + 1;
-  }
-  return parts == 4;
+  std::vector<std::string> parts = SplitList(host, '.');
+  int value = 0;
+  for (std::size_t i = 0; i < parts.size(); ++i)
+    if (!ParseInt(parts[i], value, i == 0 ? 127 : 0, i == 0 ? 127 : 255)) return false;
+  return parts.size() == 4;
 }
 
 int Usage(const char* problem) {
@@ -100,6 +78,41 @@ int Usage(const char* problem) {
   return problem ? 2 : 0;
 }
 
+// Takes the value of one option; the problem with it, if there is one.
+std::optional<std::string> TakeOption(std::string_view option, std::string_view value, Options& options,
+                                      std::vector<std::string>& files) {
+  auto number = [&](auto& out, int least, int most) -> std::optional<std::string> {
+    int parsed = 0;
+    if (!ParseInt(value, parsed, least, most))
+      return std::string(option) + " takes a number from " + std::to_string(least) + " to " + std::to_string(most);
+    out = static_cast<std::remove_reference_t<decltype(out)>>(parsed);
+    return std::nullopt;
+  };
+  if (option == "--host") options.host = value;
+  else if (option == "--port") return number(options.port, 0, 65535);
+  else if (option == "--scene") options.scene = value;
+  else if (option == "--frames") return number(options.frames, 1, 1000000);
+  else if (option == "--max-clients") return number(options.maxClients, 1, 4096);
+  else if (option == "--max-frame") return number(options.maxFrame, 64, static_cast<int>(client3::protocol::kMaxFrame));
+  else if (option == "--rate") return number(options.rate, 0, 100000000);
+  else if (option == "--token") options.token = value;
+  else if (option == "--files") files.emplace_back(value);
+  else if (option == "--fault") {
+    if (!options.faults.Add(value)) return "unknown fault '" + std::string(value) + "'";
+  } else {
+    return "unknown option " + std::string(option);
+  }
+  return std::nullopt;
+}
+
+// The scene to serve: the demo, an empty one, or a scene file's (refused, Failure, when it cannot
+// be read or is damaged).
+Scene FirstScene(const Options& options) {
+  if (options.scene == "demo") return DemoScene(options.frames);
+  if (options.scene == "empty") return EmptyScene(options.frames);
+  return LoadScene(options.scene);
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -114,49 +127,16 @@ int main(int argc, char** argv) {
       continue;
     }
     if (i + 1 >= argc) return Usage(("option " + std::string(option) + " needs a value").c_str());
-    std::string_view value = argv[++i];
-    int maxClients = 0, maxFrame = 0;
-    if (option == "--host")
-      options.host = value;
-    else if (option == "--port") {
-      if (!ParseInt(value, options.port, 0, 65535)) return Usage("--port takes a number from 0 to 65535");
-    } else if (option == "--scene")
-      options.scene = value;
-    else if (option == "--frames") {
-      if (!ParseInt(value, options.frames, 1, 1000000)) return Usage("--frames takes a number from 1 to 1000000");
-    } else if (option == "--max-clients") {
-      if (!ParseInt(value, maxClients, 1, 4096)) return Usage("--max-clients takes a number from 1 to 4096");
-      options.maxClients = static_cast<std::size_t>(maxClients);
-    } else if (option == "--max-frame") {
-      if (!ParseInt(value, maxFrame, 64, static_cast<int>(client3::protocol::kMaxFrame)))
-        return Usage("--max-frame takes a number from 64 to 67108864");
-      options.maxFrame = static_cast<std::uint32_t>(maxFrame);
-    } else if (option == "--rate") {
-      if (!ParseInt(value, options.rate, 0, 100000000)) return Usage("--rate takes a number from 0 to 100000000");
-    } else if (option == "--token")
-      options.token = value;
-    else if (option == "--files")
-      files.emplace_back(value);
-    else if (option == "--fault") {
-      if (!ParseFault(value, options)) return Usage(("unknown fault '" + std::string(value) + "'").c_str());
-    } else {
-      return Usage(("unknown option " + std::string(option)).c_str());
-    }
+    if (std::optional<std::string> problem = TakeOption(option, argv[++i], options, files)) return Usage(problem->c_str());
   }
   if (options.token.empty() && !IsLoopback(options.host))
     return Usage(("listening on " + options.host + " needs an access token: give --token or CLIENT3_TOKEN").c_str());
   if (std::string bad; !ConfineFiles(files, bad)) return Usage(("--files: no directory at '" + bad + "'").c_str());
   Scene scene;
-  if (options.scene == "demo")
-    scene = DemoScene(options.frames);
-  else if (options.scene == "empty")
-    scene = EmptyScene(options.frames);
-  else {
-    try {
-      scene = LoadScene(options.scene);
-    } catch (const Failure& failure) {
-      return Usage(failure.message.c_str());
-    }
+  try {
+    scene = FirstScene(options);
+  } catch (const Failure& failure) {
+    return Usage(failure.message.c_str());
   }
   client3::platform::OnStopRequest(RequestStop);
   return Serve(options, scene, stopRequested);

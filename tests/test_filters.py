@@ -168,9 +168,16 @@ def test_bad_constants_are_refused_and_change_nothing(app, tmp_path, operation, 
 
 
 @pytest.mark.parametrize("operation, constants", [("FilterApplyFIR", (5, 5, 100, 0)), ("FilterApplyWeightedAverage", (5, 0))])
-def test_a_missing_object_or_channel_is_refused(app, operation, constants):
+def test_a_missing_object_or_channel_is_refused_by_its_id(app, operation, constants):
     obj, channels = marker(app)
-    assert "no object with id" in app.refusal(operation, 10**12, channels["X"], "", False, *constants)[1]
-    assert "has no channel with id" in app.refusal(operation, obj, 10**12, "", False, *constants)[1]
+    other = app.SceneGetObject("/Alice/LANK")[0]
+    other_x = int(app.ObjectGetChannel(other, "X")[2])
     root = app.SceneGetObject("/")[0]
-    assert "no object" not in app.refusal(operation, root, channels["X"], "", False, *constants)[1]
+
+    def refused(object_id, channel_id):
+        return app.refusal(operation, object_id, channel_id, "", False, *constants)[1]
+
+    assert refused(10**12, channels["X"]) == f"no object with id {10**12}"
+    assert refused(obj, 10**12) == f"object {obj} has no channel with id {10**12}"
+    assert refused(obj, other_x) == f"object {obj} has no channel with id {other_x}"
+    assert refused(root, channels["X"]) == f"object {root} has no channel with id {channels['X']}"

@@ -163,15 +163,50 @@ def test_the_settings_are_kept_in_the_scene_file_and_reset_by_a_new_scene(app, t
     assert {record: values(app, record) for record in FIELDS} == saved
 
 
-def test_a_scene_file_with_a_setting_out_of_range_is_refused(app, tmp_path):
-    path = tmp_path / "bad.scene"
+def scene_with_line(app, path, record, line):
+    """Saves the scene to `path` with the settings line of `record` replaced by `line`; returns its number."""
     app.SaveFile(str(path), "")
-    text = path.read_text()
-    assert "settings Solving 1 1 0 false 1\n" in text
-    path.write_text(text.replace("settings Solving 1 1 0 false 1", "settings Solving 1 1 0 false 11"))
+    lines = path.read_text().split("\n")
+    at = next(i for i, text in enumerate(lines) if text.startswith(f"settings {record} "))
+    lines[at] = line
+    path.write_text("\n".join(lines))
+    return at + 1
+
+
+def test_the_scene_file_names_each_setting(app, tmp_path):
+    app.SaveFile(str(tmp_path / "a.scene"), "")
+    assert "settings Solving PriorImportance=1 MeanPoseRatio=1 NumThreads=0 ExtrapolateFingers=false FingerMultiplier=1\n" in (
+        tmp_path / "a.scene").read_text()
+
+
+@pytest.mark.parametrize("line, expected", [
+    # A field the line leaves out (a file saved before the field was added) keeps its default.
+    ("settings Solving PriorImportance=50 MeanPoseRatio=3 ExtrapolateFingers=true FingerMultiplier=2", (50, 3, 0, True, 2)),
+    ("settings Solving FingerMultiplier=2 NumThreads=4 PriorImportance=50", (50, 1, 4, False, 2)),
+    ("settings Solving", (1, 1, 0, False, 1)),
+    # A file written before the fields were named: every value, in the fields' order.
+    ("settings Solving 50 3 4 true 2", (50, 3, 4, True, 2)),
+])
+def test_a_scene_file_gives_the_settings_it_names(app, tmp_path, line, expected):
+    scene_with_line(app, tmp_path / "settings.scene", "Solving", line)
+    app.LoadFile(str(tmp_path / "settings.scene"))
+    assert values(app, "Solving") == expected
+
+
+@pytest.mark.parametrize("line, message", [
+    ("settings Solving PriorImportance=1 FingerMultiplier=11", "Solving setting 'FingerMultiplier' must be from 0 to 10, not '11'"),
+    ("settings Solving 1 1 0 false 11", "Solving setting 'FingerMultiplier' must be from 0 to 10, not '11'"),
+    ("settings Solving Speed=3", "the Solving settings have no field 'Speed'"),
+    ("settings Solving NumThreads=2 NumThreads=3", "the Solving setting 'NumThreads' is given twice"),
+    ("settings Solving NumThreads=2 3", "a value of the Solving settings without its field's name"),
+    ("settings Solving NumThreads=two", "a bad value of Solving setting 'NumThreads'"),
+    ("settings Solving 1 1 0 false", "the Solving settings need 5 values"),
+])
+def test_a_scene_file_with_a_bad_setting_is_refused(app, tmp_path, line, message):
+    number = scene_with_line(app, tmp_path / "bad.scene", "Solving", line)
     settings = get(app, "Solving")
     put(settings, "Solving", "MeanPoseRatio", 3)
     app.OfflineSetSolvingSettings(settings)
-    code, message = app.refusal("LoadFile", str(path))
-    assert "'FingerMultiplier' must be from 0 to 10" in message
+    code, text = app.refusal("LoadFile", str(tmp_path / "bad.scene"))
+    assert text == f"the scene file is damaged at line {number}: {message}"
     assert values(app, "Solving")[1] == 3

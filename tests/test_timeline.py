@@ -58,10 +58,20 @@ def test_range_order_is_kept(app, operation, frame):
 
 
 @pytest.mark.parametrize("operation, args", [("TimelineSetFrames", (0,)), ("TimelineSetFrames", (601,)),
-                                             ("TimelineSetPlayEnd", (601,)), ("TimelineSelectRange", (1, 601, 0))])
-def test_frames_outside_the_take_are_refused(app, operation, args):
+                                             ("TimelineSetPlayEnd", (601,)), ("TimelineSelectRange", (1, 601, 0)),
+                                             ("TimelineSetSecs", (-0.5,)), ("TimelineSetSecs", (-0.001,)),
+                                             ("TimelineSetSecs", (6.0,)), ("TimelineSetTicks", (6 * TICKS_PER_SECOND,))])
+def test_times_outside_the_take_are_refused(app, operation, args):
     assert app.refusal(operation, *args)[0] == m.InvalidFrameNumber
     assert app.TimelineGetFrames() == 1 and app.TimelineGetPlayEnd() == 600 and app.TimelineGetSelectedRanges() == []
+
+
+@pytest.mark.parametrize("seconds", [float("nan"), float("inf"), float("-inf")])
+def test_a_time_in_seconds_that_is_no_number_is_refused(app, seconds):
+    app.TimelineSetFrames(10)
+    code, message = app.refusal("TimelineSetSecs", seconds)
+    assert code == m.ApplicationError and message.startswith("a time in seconds must be a finite number")
+    assert app.TimelineGetFrames() == 10
 
 
 def test_time_code_standards(app):
