@@ -11,7 +11,7 @@ import _Client3 as m
 import pytest
 
 import companion
-from appclient import Client
+from hostproc import Client
 
 # Long enough a take that saving it takes a good part of a second.
 FRAMES = "40000"
@@ -48,7 +48,7 @@ import sys
 sys.path.insert(0, {tests!r})
 import companion
 companion.register()
-from appclient import Client
+from hostproc import Client
 import types
 client = Client(types.SimpleNamespace(address="127.0.0.1", port={port}))
 print("ready", flush=True)
@@ -116,7 +116,7 @@ def test_host_killed_as_it_begins_to_write(start_host, tmp_path):
     killer = subprocess.Popen([sys.executable, "-c", WATCHER, str(host.process.pid), str(files)],
                               stdout=subprocess.PIPE, text=True)
     assert killer.stdout.readline() == "watching\n"
-    assert app.refusal("SaveFile", str(path), "")[0] in (m.Success, m.NotConnected)
+    assert app.result("SaveFile", str(path), "")[0] in (m.Success, m.NotConnected)
     assert killer.wait(40) == 0
     assert path.read_bytes() in (old, new)
     # A fresh host reads the file whole.

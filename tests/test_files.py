@@ -3,14 +3,12 @@ application), atomic writes, and damaged or hostile files refused with the scene
 import _Client3 as m
 import pytest
 
-from appclient import Client
+from hostproc import Client
 
 
 @pytest.fixture
-def app(start_host):
-    client = Client(start_host("--frames", "50"))
-    yield client
-    client.close()
+def frames():
+    return 50
 
 
 def at(app, path):
@@ -100,8 +98,8 @@ def test_saving_replaces_the_file_and_leaves_nothing_else(app, tmp_path):
 
 def test_failed_save_keeps_the_old_file(app, tmp_path):
     missing = tmp_path / "no such directory" / "scene.c3scene"
-    assert app.refusal("SaveFile", str(missing), "") == (m.ApplicationError, f"cannot write the file '{missing}'")
-    assert app.refusal("SaveFile", str(tmp_path / "s"), "Compress=yes") == (
+    assert app.result("SaveFile", str(missing), "") == (m.ApplicationError, f"cannot write the file '{missing}'")
+    assert app.result("SaveFile", str(tmp_path / "s"), "Compress=yes") == (
         m.ApplicationError, "'SaveFile' takes no options: 'Compress=yes'")
     assert app.GetSceneName() == ("Demo", "")
 
@@ -133,8 +131,8 @@ def test_damaged_files_are_refused_and_the_scene_is_kept(app, tmp_path):
     bad = tmp_path / "bad.c3scene"
     for damaged in damaged_files(text):
         bad.write_bytes(damaged.encode("utf-8", "surrogateescape"))
-        code, message = app.refusal("LoadFile", str(bad))
+        code, message = app.result("LoadFile", str(bad))
         assert code == m.ApplicationError and message.startswith("the scene file is damaged at line "), damaged[:80]
-    assert app.refusal("LoadFile", str(tmp_path / "none")) == (m.ApplicationError, f"cannot read the file '{tmp_path / 'none'}'")
-    assert app.refusal("LoadFile", str(tmp_path)) == (m.ApplicationError, f"cannot read the file '{tmp_path}'")
+    assert app.result("LoadFile", str(tmp_path / "none")) == (m.ApplicationError, f"cannot read the file '{tmp_path / 'none'}'")
+    assert app.result("LoadFile", str(tmp_path)) == (m.ApplicationError, f"cannot read the file '{tmp_path}'")
     assert snapshot(app) == before

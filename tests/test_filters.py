@@ -4,17 +4,13 @@ import numpy as np
 import pytest
 from scipy import signal
 
-from appclient import Client
-
 FRAMES = 300
 MARKER = ("Alice", "RANK")  # a marker with a gap in the demo take
 
 
 @pytest.fixture
-def app(start_host):
-    client = Client(start_host("--frames", str(FRAMES)))
-    yield client
-    client.close()
+def frames():
+    return FRAMES
 
 
 def marker(app):
@@ -130,7 +126,7 @@ def test_a_filter_says_how_many_samples_it_changed(app, operation, constants, ho
     values, seen = trajectory(app)
     seen[100] = seen[103] = False  # frames 101 and 102 (indices) become a stretch of two
     app.SetTrajectory(*MARKER, *[list(v) for v in values], [bool(v) for v in seen])
-    code, text = app.refusal(operation, obj, channels["X"], "XYZ", False, *constants)
+    code, text = app.result(operation, obj, channels["X"], "XYZ", False, *constants)
     after, _ = trajectory(app)
     half = constants[0] // 2
     short = 3 * sum(end - first for first, end in runs(seen) if end - first <= half)
@@ -162,7 +158,7 @@ REFUSED = [
 def test_bad_constants_are_refused_and_change_nothing(app, tmp_path, operation, args, message):
     obj, channels = marker(app)
     before = scene_bytes(app, tmp_path / "before.scene")
-    code, text = app.refusal(operation, obj, channels["X"], *args)
+    code, text = app.result(operation, obj, channels["X"], *args)
     assert message in text
     assert scene_bytes(app, tmp_path / "after.scene") == before
 
@@ -175,7 +171,7 @@ def test_a_missing_object_or_channel_is_refused_by_its_id(app, operation, consta
     root = app.SceneGetObject("/")[0]
 
     def refused(object_id, channel_id):
-        return app.refusal(operation, object_id, channel_id, "", False, *constants)[1]
+        return app.result(operation, object_id, channel_id, "", False, *constants)[1]
 
     assert refused(10**12, channels["X"]) == f"no object with id {10**12}"
     assert refused(obj, 10**12) == f"object {obj} has no channel with id {10**12}"

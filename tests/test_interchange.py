@@ -9,7 +9,7 @@ import _Client3 as m
 import numpy as np
 import pytest
 
-from appclient import Client
+from hostproc import Client
 
 c3d = pytest.importorskip("c3d")
 # The independent writer warns about every file without analog channels.
@@ -17,10 +17,8 @@ pytestmark = pytest.mark.filterwarnings("ignore:No analog data found")
 
 
 @pytest.fixture
-def app(start_host):
-    client = Client(start_host("--frames", "50"))
-    yield client
-    client.close()
+def frames():
+    return 50
 
 
 def trajectories(app):
@@ -243,7 +241,7 @@ def test_damaged_files_are_refused_and_the_scene_is_kept(app, tmp_path, kind):
     for number, data in enumerate(damaged):
         bad.write_bytes(data)
         for merge in (False, True):
-            code, message = app.refusal("ImportFile", str(bad), "", merge)
+            code, message = app.result("ImportFile", str(bad), "", merge)
             assert code == m.ApplicationError, (number, message)
             assert message.startswith(("the C3D file is damaged: ", "the CSV file is damaged at line ",
                                        "the point ")), (number, message)
@@ -270,7 +268,7 @@ def test_refusals_name_the_reason_and_keep_the_scene(app, tmp_path):
         ("ExportFile", str(tmp_path / "x"), ""), f"no file format '' (csv or c3d) for '{tmp_path / 'x'}'",
     ]
     for args, message in zip(cases[::2], cases[1::2]):
-        assert app.refusal(*args) == (m.ApplicationError, message)
+        assert app.result(*args) == (m.ApplicationError, message)
     assert state(app) == before
     assert not (tmp_path / "x").exists()
 
@@ -284,5 +282,5 @@ def test_markers_a_c3d_file_cannot_hold_are_refused(app, tmp_path, marker, value
     app.ChannelSetValue(created, int(app.ObjectGetChannel(created, "X")[2]), 1, 0, 0, value, "")
     for axis in "YZ":
         app.ChannelSetValue(created, int(app.ObjectGetChannel(created, axis)[2]), 1, 0, 0, "0", "")
-    assert app.refusal("ExportFile", str(tmp_path / "x.c3d"), "") == (m.ApplicationError, message)
+    assert app.result("ExportFile", str(tmp_path / "x.c3d"), "") == (m.ApplicationError, message)
     assert not (tmp_path / "x.c3d").exists()

@@ -11,7 +11,7 @@ import pytest
 from scipy import interpolate
 
 import _Client3 as m
-from appclient import Client
+from hostproc import Client
 
 RIGID = 1e-6  # mm: the demo's markers on one segment move together, so a neighbour's fill is exact
 # mm: the reference page's bounds on cubic fills of gaps up to 0.2 s, found by filling every such gap
@@ -162,7 +162,7 @@ def test_a_refused_fix_changes_nothing(app, tmp_path, subject, options, setting,
     if setting:
         set_occlusion(app, *setting)
     app.SaveFile(str(tmp_path / "before.scene"), "")
-    assert message in app.refusal("OfflineFixOcclusion", subject, options)[1]
+    assert message in app.result("OfflineFixOcclusion", subject, options)[1]
     app.SaveFile(str(tmp_path / "after.scene"), "")
     assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
 
@@ -259,11 +259,11 @@ def fix_summary(app, subject, longest=50):
 def test_occlusion_fixing_says_for_each_subject_what_it_filled_and_left(app):
     cut(app, "Bob", "RKNE", 0, 3)  # a gap at the take's start stays
     expected = "; ".join(fix_summary(app, subject) for subject in ("Alice", "Bob"))
-    assert app.refusal("OfflineFixOcclusion", "", "") == (m.Success, expected)
-    assert app.refusal("PSL", "OfflineFixOcclusion Subject=Alice") == (m.Success, fix_summary(app, "Alice"))  # by name too
+    assert app.result("OfflineFixOcclusion", "", "") == (m.Success, expected)
+    assert app.result("PSL", "OfflineFixOcclusion Subject=Alice") == (m.Success, fix_summary(app, "Alice"))  # by name too
     set_occlusion(app, "ApplyFixedMarkers", False)
     cut(app, "Alice", "C7", 100, 10)
-    assert app.refusal("OfflineFixOcclusion", "Alice", "") == (
+    assert app.result("OfflineFixOcclusion", "Alice", "") == (
         m.Success, fix_summary(app, "Alice") + "; the filled frames stay unseen (ApplyFixedMarkers is off)")
 
 
@@ -308,7 +308,7 @@ def test_each_stage_says_what_it_did(app):
     }
     for operation, args in CHAIN:
         before = expected[operation]() if expected[operation] else translations(app, "Alice")
-        code, text = app.refusal(operation, *args)
+        code, text = app.result(operation, *args)
         if not expected[operation]:
             changed = sum(a != b for a, b in zip(before, translations(app, "Alice")))
             before = f"Alice: translations of {changed} of {bones} bones set"
@@ -317,7 +317,7 @@ def test_each_stage_says_what_it_did(app):
 
 def test_quick_post_says_what_each_of_its_stages_did(app):
     run_chain(app, 8)
-    code, text = app.refusal("OfflineQuickPost", "Alice", "")
+    code, text = app.result("OfflineQuickPost", "Alice", "")
     assert code == m.Success
     assert re.fullmatch(r"OfflineAutoLabel Alice: \d+ labels given, .*; 0 points dropped; "
                         r"OfflineFixOcclusion Alice: \d+ gaps? filled \(.*\), \d+ left \(.*\); "
@@ -326,8 +326,8 @@ def test_quick_post_says_what_each_of_its_stages_did(app):
 
 
 def test_other_commands_answer_success_with_the_codes_text(app):
-    assert app.refusal("GetSubjectNames") == (m.Success, "OK")
-    assert app.refusal("OfflineSetOcclusionFixingSettings", app.record("OfflineGetOcclusionFixingSettings")) == (m.Success, "OK")
+    assert app.result("GetSubjectNames") == (m.Success, "OK")
+    assert app.result("OfflineSetOcclusionFixingSettings", app.record("OfflineGetOcclusionFixingSettings")) == (m.Success, "OK")
 
 NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the refusal)
     (0, "OfflineReconstruct", ("",), "'OfflineReconstruct' needs 'OfflineCalibrateCameras' to run first"),
@@ -349,23 +349,23 @@ def test_a_stage_whose_need_has_not_run_is_refused_and_changes_nothing(app, tmp_
     for earlier, earlier_args in CHAIN[:ran]:
         getattr(app, earlier)(*earlier_args)
     app.SaveFile(str(tmp_path / "before.scene"), "")
-    assert message in app.refusal(operation, *args)[1]
+    assert message in app.result(operation, *args)[1]
     app.SaveFile(str(tmp_path / "after.scene"), "")
     assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
 
 
 def test_camera_calibration_needs_two_cameras(app):
     app.NewScene()
-    assert "needs at least two cameras in the scene, and there are 0" in app.refusal("OfflineCalibrateCameras", "")[1]
+    assert "needs at least two cameras in the scene, and there are 0" in app.result("OfflineCalibrateCameras", "")[1]
 
 
 def test_quick_post_runs_its_stages_in_order_and_stops_at_the_first_that_cannot_run(app):
-    assert app.refusal("OfflineQuickPost", "Alice", "")[1] == (
+    assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineAutoLabel': 'OfflineAutoLabel' needs 'OfflineReconstruct' to run first")
     assert state(app) == {}
     for operation, args in CHAIN[:4]:
         getattr(app, operation)(*args)
-    assert app.refusal("OfflineQuickPost", "Alice", "")[1] == (
+    assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineSolve': 'OfflineSolve' needs 'OfflineCalibrateSolvingSubjects' to run first for subject 'Alice'")
     assert {"Pipeline OfflineAutoLabel Alice", "Pipeline OfflineFixOcclusion Alice"} <= set(state(app))
     assert "Pipeline OfflineSolve Alice" not in state(app)
@@ -458,7 +458,7 @@ def test_labelling_refuses_templates_closer_than_the_separation_distance(app, tm
     m.Output_LabelROMSettings_SeparationDistance_set(settings, 200)
     app.OfflineSetLabelROMSettings(settings)
     app.SaveFile(str(tmp_path / "before.scene"), "")
-    message = app.refusal("OfflineLabelROM", "Alice", "")[1]
+    message = app.result("OfflineLabelROM", "Alice", "")[1]
     assert "of subject 'Alice' lie closer together than the LabelROM setting 'SeparationDistance' (200 mm)" in message
     app.SaveFile(str(tmp_path / "after.scene"), "")
     assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
@@ -570,7 +570,7 @@ def test_a_stage_that_cannot_compute_its_result_is_refused_and_changes_nothing(a
     run_chain(app, ran)
     spoil(app)
     app.SaveFile(str(tmp_path / "before.scene"), "")
-    assert app.refusal(operation, *args)[1] == message
+    assert app.result(operation, *args)[1] == message
     app.SaveFile(str(tmp_path / "after.scene"), "")
     assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
 
@@ -580,7 +580,7 @@ STAGE_IN_CHILD = """
 import sys
 sys.path[:0] = [sys.argv[1]]
 import companion
-from appclient import Client
+from hostproc import Client
 companion.register()
 
 class Host:

@@ -13,7 +13,7 @@ import pytest
 
 import companion
 import hostproc
-from appclient import Client
+from hostproc import Client
 
 TOKEN = "correct horse"
 NEEDS_TOKEN = "the application needs its access token, and the client did not give it"
@@ -228,7 +228,7 @@ def test_file_commands_outside_the_named_directories_are_refused(start_host, pla
     before = outside_contents(outside), app.GetSceneName()
     args = filled(args, allowed, outside)
     path = args[1] if operation == "DatabaseSetCurrent" else args[0]
-    assert app.refusal(operation, *args) == (m.ApplicationError, f"'{path}' is not inside the directories the application may use")
+    assert app.result(operation, *args) == (m.ApplicationError, f"'{path}' is not inside the directories the application may use")
     assert (outside_contents(outside), app.GetSceneName()) == before
     assert app.DatabaseGetCurrent("Database") == ""
     app.close()
@@ -251,7 +251,7 @@ def test_a_request_over_the_frame_limit_is_refused(start_host):
     app.SetTrajectoryAtFrame("Alice", "LANK", 5, 1.0, 2.0, 3.0, True)
     xyz = companion.classes["vectord"]([1.0] * 1000)
     seen = companion.classes["vectorb"]([True] * 1000)
-    assert app.refusal("SetTrajectory", "Alice", "LANK", xyz, xyz, xyz, seen) == (
+    assert app.result("SetTrajectory", "Alice", "LANK", xyz, xyz, xyz, seen) == (
         m.ApplicationError, "a frame may hold at most 4096 bytes")
     assert app.IsConnected() is False
     again = Client(host)
