@@ -102,6 +102,21 @@ def start_host(tmp_path):
 
 
 @pytest.fixture
+def clients():
+    """Makes clients (hostproc.Client), connected (with address options) to a host when one is given;
+    each is deleted after the test."""
+    made = []
+
+    def make(host=None, options=""):
+        made.append(hostproc.Client(host, options))
+        return made[-1]
+
+    yield make
+    for client in made:
+        client.close()
+
+
+@pytest.fixture
 def frames():
     """The take length of `app`'s demo scene; a test module that wants another overrides it."""
     return 1000

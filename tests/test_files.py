@@ -3,7 +3,6 @@ application), atomic writes, and damaged or hostile files refused with the scene
 import _Client3 as m
 import pytest
 
-from hostproc import Client
 
 
 @pytest.fixture
@@ -65,19 +64,17 @@ def edit(app):
     app.TimelineSelectRange(5, 9, 0)
 
 
-def test_saved_scene_loads_the_same_in_a_fresh_application(app, start_host, tmp_path):
+def test_saved_scene_loads_the_same_in_a_fresh_application(app, start_host, clients, tmp_path):
     edit(app)
     path = str(tmp_path / "walk é.c3scene")
     app.SaveFile(path, "")
     assert app.GetSceneName() == ("Edited scene", path)
     before = snapshot(app)
-    other = Client(start_host("--frames", "5"))
+    other = clients(start_host("--frames", "5"))
     other.LoadFile(path)
     assert other.GetSceneName() == ("Edited scene", path)
     assert snapshot(other) == before
-    fresh = Client(start_host("--scene", path))
-    assert snapshot(fresh) == before
-    other.close(), fresh.close()
+    assert snapshot(clients(start_host("--scene", path))) == before
 
 
 def test_new_scene_is_empty_and_keeps_the_take_length(app):

@@ -9,7 +9,6 @@ import _Client3 as m
 import numpy as np
 import pytest
 
-from hostproc import Client
 
 c3d = pytest.importorskip("c3d")
 # The independent writer warns about every file without analog channels.
@@ -79,8 +78,8 @@ def test_exported_c3d_is_read_by_an_independent_reader(app, tmp_path):
         assert np.array_equal(points[:, :3], np.float32(np.array([x, y, z]).T * np.array(e)[:, None]))
 
 
-def test_a_take_longer_than_a_c3d_header_can_count(start_host, tmp_path):
-    app = Client(start_host("--scene", "empty", "--frames", "70000"))
+def test_a_take_longer_than_a_c3d_header_can_count(start_host, clients, tmp_path):
+    app = clients(start_host("--scene", "empty", "--frames", "70000"))
     subject = app.SceneCreateObject("Subject", "S", app.SceneGetObject("/")[0], "")[0]
     marker = app.SceneCreateObject("Marker", "M", subject, "")[0]
     app.SetTrajectoryAtFrame("S", "M", 70000, 1.5, 2.5, 3.5, True)
@@ -91,7 +90,6 @@ def test_a_take_longer_than_a_c3d_header_can_count(start_host, tmp_path):
     app.ImportFile(str(tmp_path / "long.c3d"), "", False)
     assert app.GetTrajectoryAtFrame("S", "M", 70000) == (1.5, 2.5, 3.5, True)
     assert marker not in app.SceneGetObjectList("Marker")[0]
-    app.close()
 
 
 @pytest.mark.parametrize("analog", [0, 3])
@@ -122,18 +120,17 @@ def test_merge_writes_the_file_into_the_scene(app, tmp_path):
     assert app.GetSceneName() == ("Demo", "") and app.GetSubjectNames()[0] == ["Alice", "Bob", "Dave"]
 
 
-def test_c3d_round_trip_keeps_float_values_and_gaps(app, start_host, tmp_path):
+def test_c3d_round_trip_keeps_float_values_and_gaps(app, start_host, clients, tmp_path):
     app.SetTrajectoryAtFrame("Bob", "C7", 3, 0.1, -1e6, 123.456, True)
     app.ExportFile(str(tmp_path / "t.c3d"), "")
-    other = Client(start_host("--scene", "empty"))
+    other = clients(start_host("--scene", "empty"))
     other.ImportFile(str(tmp_path / "t.c3d"), "", False)
     rounded = {name: tuple(list(np.float32(axis).astype(float)) for axis in t[:3]) + (t[3],)
                for name, t in trajectories(app).items()}
     assert seen(trajectories(other)) == seen(rounded) and other.GetFrameCount() == 50
-    other.close()
 
 
-def test_csv_export_has_one_row_per_frame_and_round_trips_exactly(app, start_host, tmp_path):
+def test_csv_export_has_one_row_per_frame_and_round_trips_exactly(app, start_host, clients, tmp_path):
     alice = app.SceneGetObject("/Alice")[0]
     app.ObjectSetAttributeValue(alice, "Name", 'Al, "the" walker')
     lank = app.SceneGetObject('/Al, "the" walker/LANK')[0]
@@ -149,12 +146,11 @@ def test_csv_export_has_one_row_per_frame_and_round_trips_exactly(app, start_hos
     assert [row[0] for row in rows[1:]] == [str(f) for f in range(1, 51)]
     column = rows[0].index('Al, "the" walker:LANK:Y')
     assert rows[5][column] == "0.30000000000000004" and rows[6][column] == ""
-    other = Client(start_host("--scene", "empty", "--frames", "3"))
+    other = clients(start_host("--scene", "empty", "--frames", "3"))
     other.TimelineSetFrameRate(60.0)
     other.ImportFile(str(path), "CSV", False)
     assert seen(trajectories(other)) == seen(expected)
     assert other.GetFrameCount() == 50 and other.TimelineGetFrameRate() == 60.0
-    other.close()
 
 
 def test_csv_written_elsewhere_is_imported(app, tmp_path):

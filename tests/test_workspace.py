@@ -6,8 +6,6 @@ import os
 import _Client3 as m
 import pytest
 
-from hostproc import Client
-
 
 @pytest.fixture
 def host(start_host):
@@ -15,10 +13,8 @@ def host(start_host):
 
 
 @pytest.fixture
-def app(host):
-    client = Client(host)
-    yield client
-    client.close()
+def app(host, clients):
+    return clients(host)
 
 
 def script_lines(host):
