@@ -149,18 +149,22 @@ def start(*options, log_path, timeout=10, command=None, env=None):
     return Host(process, int(line[len(prefix):]), log_path)
 
 
-def unread_bytes(port):
-    """The bytes that wait unread in this machine's connections to `port` on the loopback (Linux only)."""
+def _loopback_connections():
+    """This machine's TCP connections (Linux's /proc/net/tcp): (local port, remote port, state, bytes unread)."""
     with open("/proc/net/tcp") as table:
         rows = [line.split() for line in table.readlines()[1:]]
-    return sum(int(row[4].split(":")[1], 16) for row in rows if int(row[2].split(":")[1], 16) == port)
+    return [(int(row[1].split(":")[1], 16), int(row[2].split(":")[1], 16), row[3], int(row[4].split(":")[1], 16))
+            for row in rows]
+
+
+def unread_bytes(port):
+    """The bytes that wait unread in this machine's connections to `port` (Linux only)."""
+    return sum(unread for _, remote, _, unread in _loopback_connections() if remote == port)
 
 
 def connections_of(port):
-    """The connections that `port` of this machine holds on the loopback, listening aside (Linux only)."""
-    with open("/proc/net/tcp") as table:
-        rows = [line.split() for line in table.readlines()[1:]]
-    return sum(1 for row in rows if int(row[1].split(":")[1], 16) == port and row[3] != "0A")
+    """The connections that `port` of this machine holds, listening aside (Linux only)."""
+    return sum(1 for local, _, state, _ in _loopback_connections() if local == port and state != "0A")
 
 
 # ---- Through the module -------------------------------------------------------------------------

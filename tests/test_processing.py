@@ -301,16 +301,6 @@ def test_each_stage_says_and_records_what_it_did(app):
     assert seen_frames(app, "Alice").all(axis=0).sum() == 920
 
 
-def test_quick_post_says_what_each_of_its_stages_did(app):
-    run_chain(app, 8)
-    code, text = app.result("OfflineQuickPost", "Alice", "")
-    assert code == m.Success
-    assert re.fullmatch(r"OfflineAutoLabel Alice: \d+ labels given, .*; 0 points dropped; "
-                        r"OfflineFixOcclusion Alice: \d+ gaps? filled \(.*\), \d+ left \(.*\); "
-                        r"OfflineSolve Alice: 13 bones solved into TX, TY and TZ, every one of them placed at 920 of 1000 frames",
-                        text), text
-
-
 NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the refusal)
     (0, "OfflineReconstruct", ("",), "'OfflineReconstruct' needs 'OfflineCalibrateCameras' to run first"),
     (1, "OfflineLabelROM", ("Alice", ""), "'OfflineLabelROM' needs 'OfflineReconstruct' to run first"),
@@ -341,7 +331,7 @@ def test_camera_calibration_needs_two_cameras(app):
     assert "needs at least two cameras in the scene, and there are 0" in app.result("OfflineCalibrateCameras", "")[1]
 
 
-def test_quick_post_runs_its_stages_in_order_and_stops_at_the_first_that_cannot_run(app):
+def test_quick_post_runs_its_stages_in_order_until_one_cannot_run(app):
     assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineAutoLabel': 'OfflineAutoLabel' needs 'OfflineReconstruct' to run first")
     assert state(app) == {}
@@ -353,7 +343,12 @@ def test_quick_post_runs_its_stages_in_order_and_stops_at_the_first_that_cannot_
     assert "Pipeline OfflineSolve Alice" not in state(app)
     for operation, args in CHAIN[6:8]:
         getattr(app, operation)(*args)
-    app.OfflineQuickPost("Alice", "")
+    code, text = app.result("OfflineQuickPost", "Alice", "")
+    assert code == m.Success
+    assert re.fullmatch(r"OfflineAutoLabel Alice: \d+ labels given, .*; 0 points dropped; "
+                        r"OfflineFixOcclusion Alice: \d+ gaps? filled \(.*\), \d+ left \(.*\); "
+                        r"OfflineSolve Alice: 13 bones solved into TX, TY and TZ, every one of them placed at 920 of 1000 frames",
+                        text), text
     assert state(app)["Pipeline OfflineSolve Alice"].startswith("bones=13,frames=920;")
 
 
