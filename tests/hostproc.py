@@ -237,6 +237,11 @@ class Client:
         values = [plain(getattr(m, f"{kind}_{name}_get")(record), type_) for name, type_ in outputs]
         return values[0] if len(values) == 1 else tuple(values) if values else None
 
+    def scene_file(self, path):
+        """The scene as its file's bytes, saved to `path`: two such reads tell whether it changed."""
+        self.SaveFile(str(path), "")
+        return path.read_bytes()
+
     def __getattr__(self, operation):
         return lambda *args: self._run(operation, *args)
 

@@ -4,7 +4,6 @@ import _Client3 as m
 import pytest
 
 
-
 @pytest.fixture
 def frames():
     return 50

@@ -151,10 +151,9 @@ def test_without_apply_fixed_markers_the_values_are_written_and_the_frames_stay_
 def test_a_refused_fix_changes_nothing(app, tmp_path, subject, options, setting, message):
     if setting:
         set_occlusion(app, *setting)
-    app.SaveFile(str(tmp_path / "before.scene"), "")
+    before = app.scene_file(tmp_path / "scene")
     assert message in app.result("OfflineFixOcclusion", subject, options)[1]
-    app.SaveFile(str(tmp_path / "after.scene"), "")
-    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+    assert app.scene_file(tmp_path / "scene") == before
 
 
 # ---- The pipeline: the order of the stages, their preconditions and their recorded results ----
@@ -320,10 +319,9 @@ NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the ref
 def test_a_stage_whose_need_has_not_run_is_refused_and_changes_nothing(app, tmp_path, ran, operation, args, message):
     for earlier, earlier_args in CHAIN[:ran]:
         getattr(app, earlier)(*earlier_args)
-    app.SaveFile(str(tmp_path / "before.scene"), "")
+    before = app.scene_file(tmp_path / "scene")
     assert message in app.result(operation, *args)[1]
-    app.SaveFile(str(tmp_path / "after.scene"), "")
-    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+    assert app.scene_file(tmp_path / "scene") == before
 
 
 def test_camera_calibration_needs_two_cameras(app):
@@ -434,11 +432,10 @@ def test_labelling_refuses_templates_closer_than_the_separation_distance(app, tm
     settings = app.record("OfflineGetLabelROMSettings")
     m.Output_LabelROMSettings_SeparationDistance_set(settings, 200)
     app.OfflineSetLabelROMSettings(settings)
-    app.SaveFile(str(tmp_path / "before.scene"), "")
+    before = app.scene_file(tmp_path / "scene")
     message = app.result("OfflineLabelROM", "Alice", "")[1]
     assert "of subject 'Alice' lie closer together than the LabelROM setting 'SeparationDistance' (200 mm)" in message
-    app.SaveFile(str(tmp_path / "after.scene"), "")
-    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+    assert app.scene_file(tmp_path / "scene") == before
 
 
 @pytest.mark.parametrize("constraint, markers", [
@@ -475,7 +472,6 @@ def test_solving_places_each_bone_where_its_markers_put_it(app):
     assert np.abs(pelvis - centre).max() < 1e-3
 
 
-
 def test_a_bone_with_one_marker_unseen_is_still_at_the_centre_of_its_markers(app):
     run_chain(app, 9)
     heads = [trajectory(app, "Alice", marker)[0][:, 504] for marker in ("LFHD", "RFHD")]
@@ -484,6 +480,7 @@ def test_a_bone_with_one_marker_unseen_is_still_at_the_centre_of_its_markers(app
     head, keyed = bone_path(app, "Alice", "Pelvis/Thorax/Head", "T", [505])
     assert keyed.all()
     assert np.abs(head[:, 0] - np.mean(heads, axis=0)).max() < 1e-3
+
 
 def test_a_bone_without_markers_follows_its_parent_and_one_whose_markers_are_unseen_has_no_key(app):
     run_chain(app, 9)
@@ -514,11 +511,9 @@ def test_retargeting_scales_each_bone_offset_from_the_root_to_the_standard_heigh
 
 def test_solved_bone_channels_are_kept_in_the_scene_file(app, tmp_path):
     run_chain(app, 10)
-    app.SaveFile(str(tmp_path / "solved.scene"), "")
+    solved = app.scene_file(tmp_path / "solved.scene")
     app.LoadFile(str(tmp_path / "solved.scene"))
-    app.SaveFile(str(tmp_path / "again.scene"), "")
-    assert (tmp_path / "again.scene").read_bytes() == (tmp_path / "solved.scene").read_bytes()
-
+    assert app.scene_file(tmp_path / "again.scene") == solved
 
 
 def hide_marker(app, subject="Alice"):
@@ -546,10 +541,10 @@ def zero_height(app):
 def test_a_stage_that_cannot_compute_its_result_is_refused_and_changes_nothing(app, tmp_path, ran, spoil, operation, args, message):
     run_chain(app, ran)
     spoil(app)
-    app.SaveFile(str(tmp_path / "before.scene"), "")
+    before = app.scene_file(tmp_path / "scene")
     assert app.result(operation, *args)[1] == message
-    app.SaveFile(str(tmp_path / "after.scene"), "")
-    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+    assert app.scene_file(tmp_path / "scene") == before
+
 
 # ---- Long stages: progress in the log, and other clients served meanwhile ----
 

@@ -1,7 +1,7 @@
 """The application built for 64-bit Windows with mingw-w64, run under Wine and driven by this system's
 client: the command protocol, the scene, subject and trajectory operations (every query answered as
 the application built for this system answers it), trajectories written and read back, scene files,
-the result codes, a client that vanishes and a clean stop.
+a client that vanishes and a clean stop.
 
 The library and the application are built once per session into build/windows of the source tree;
 Wine gets a prefix of the session's own. Without the cross-compiler, CMake or Wine the module is
@@ -164,25 +164,6 @@ def test_scene_file_saved_over_and_loaded(start_windows, clients, tmp_path):
     client.NewScene()
     client.LoadFile(path)
     assert client.GetSceneName() == ("Überlauf 1", path)
-
-
-# ---- Result codes that the client makes of a misbehaving application ------------------------------
-
-
-@pytest.fixture(scope="module")
-def faulty_host(start_windows):
-    faults = ["delay=1000@GetSceneName", "garbage@GetSubjectNames", "text@GetSubjectParamDetails", "frames=2"]
-    return start_windows(*[word for fault in faults for word in ("--fault", fault)])
-
-
-@pytest.mark.parametrize("code, operation, args, options", [
-    (m.RequestTimedOut, "GetSceneName", (), "timeout=300"),
-    (m.ReplyParsingError, "GetSubjectNames", (), ""),
-    (m.ConversionError, "GetSubjectParamDetails", ("Alice", "", "Height"), ""),
-    (m.ExpectedOneFrame, "GetTrajectoryAtFrame", ("Alice", "LANK", 1), ""),
-])
-def test_result_code(faulty_host, clients, code, operation, args, options):
-    assert clients(faulty_host, options).result(operation, *args) == (code, m.ToString(code))
 
 
 # ---- A client that vanishes, and the application's stop -----------------------------------------------
