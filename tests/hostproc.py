@@ -149,7 +149,7 @@ def start(*options, log_path, timeout=10, command=None, env=None):
     return Host(process, int(line[len(prefix):]), log_path)
 
 
-def _loopback_connections():
+def _tcp_connections():
     """This machine's TCP connections (Linux's /proc/net/tcp): (local port, remote port, state, bytes unread)."""
     with open("/proc/net/tcp") as table:
         rows = [line.split() for line in table.readlines()[1:]]
@@ -159,12 +159,12 @@ def _loopback_connections():
 
 def unread_bytes(port):
     """The bytes that wait unread in this machine's connections to `port` (Linux only)."""
-    return sum(unread for _, remote, _, unread in _loopback_connections() if remote == port)
+    return sum(unread for _, remote, _, unread in _tcp_connections() if remote == port)
 
 
 def connections_of(port):
     """The connections that `port` of this machine holds, listening aside (Linux only)."""
-    return sum(1 for local, _, state, _ in _loopback_connections() if local == port and state != "0A")
+    return sum(1 for local, _, state, _ in _tcp_connections() if local == port and state != "0A")
 
 
 # ---- Through the module -------------------------------------------------------------------------
