@@ -233,12 +233,6 @@ def test_the_command_line_exits_with_its_status_and_a_summary(takes, tmp_path, j
     assert done.stderr == "".join(f"failed: {path}: ValueError: refusing bad.scene\n" for path in extra)
 
 
-def test_the_command_line_runs_on_a_dask_cluster(takes, dask_cluster):
-    done = command("batchjobs:fix", *takes, "--cluster", dask_cluster.scheduler.address, "--retries", "0")
-    assert done.returncode == 0, done.stderr
-    assert done.stdout.startswith(f"done {TAKES}, failed 0, retried 0, "), done.stdout
-
-
 @pytest.mark.parametrize("arguments, message", [
     (["nosuchmodule:fix", "x.scene"], "cannot import nosuchmodule:fix: ModuleNotFoundError: No module named 'nosuchmodule'"),
     (["batchjobs:nothing", "x.scene"], "cannot import batchjobs:nothing: AttributeError: module 'batchjobs' has no attribute 'nothing'"),

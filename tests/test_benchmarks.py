@@ -29,10 +29,10 @@ ROWS = {
                  "tuple of floats -> vectord", "list of bools -> vectorb", "import (self time)",
                  "Client3 GetFrameCount, unconnected", "Client3 ParameterGet, unconnected, by keyword",
                  "Client3 GetTrajectoryAtFrame, host, by position", "Client3 GetTrajectoryAtFrame, host, by keyword",
-                 "round trip to the host (GetFrameCount)", "import Client3 (with what it imports)"]
-                + (["memory per element, vectord"] if HEAP_MEASURED else []),
-    "bench_processing.py": [f"{command}: {who}" for command in ("FilterApplyFIR, one marker, 61 taps",
-                                                               "OfflineFixOcclusion, both subjects")
+                 "round trip to the host (GetFrameCount)", "import Client3 (with what it imports)",
+                 *(["memory per element, vectord"] if HEAP_MEASURED else [])],
+    "bench_processing.py": [f"{command}: {who}"
+                            for command in ("FilterApplyFIR, one marker, 61 taps", "OfflineFixOcclusion, both subjects")
                             for who in ("NumPy/SciPy", "client3-host")],
     "bench_batch.py": ["process pool", "Dask", "goal: "],
     "bench_load.py": ["4 clients, 800 calls in ", "write", "read", "trajectory", "count", "markers", "subjects", "all",

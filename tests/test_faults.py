@@ -72,9 +72,8 @@ def folder_state(folder):
 def test_client_killed_mid_save(start_host, tmp_path):
     host, app, files, path, reference = saved_take(start_host, tmp_path)
     old, before = path.read_bytes(), folder_state(files)
-    saver = subprocess.Popen([sys.executable, "-c", SAVER.format(tests=os.path.dirname(__file__), port=host.port,
-                                                                  name="Saved by a client", path=str(path))],
-                             stdout=subprocess.PIPE, text=True)
+    script = SAVER.format(tests=os.path.dirname(__file__), port=host.port, name="Saved by a client", path=str(path))
+    saver = subprocess.Popen([sys.executable, "-c", script], stdout=subprocess.PIPE, text=True)
     assert saver.stdout.readline() == "ready\n"
     # Killed as soon as the host begins to write the file.
     assert wait_until(lambda: folder_state(files) != before, seconds=30)
