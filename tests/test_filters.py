@@ -47,13 +47,15 @@ def fir(taps, cutoff, rate, transition):
     return signal.firwin(taps, cutoff + transition / 2, window="hamming", fs=rate)
 
 
-@pytest.mark.parametrize("taps, cutoff, rate, transition", [
-    (1, 10, 100, 0), (5, 6, 100, 0), (21, 6, 100, 4), (31, 1.5, 0, 2), (61, 20, 250, 10), (299, 8, 100, 1),
+# The constants, and the channel named with component XYZ (any of the three stands for all three).
+@pytest.mark.parametrize("taps, cutoff, rate, transition, named", [
+    (1, 10, 100, 0, "X"), (5, 6, 100, 0, "Y"), (21, 6, 100, 4, "Z"), (31, 1.5, 0, 2, "X"), (61, 20, 250, 10, "Y"),
+    (299, 8, 100, 1, "Z"),
 ])
-def test_fir_matches_the_same_coefficients_applied_with_scipy(app, taps, cutoff, rate, transition):
+def test_fir_matches_the_same_coefficients_applied_with_scipy(app, taps, cutoff, rate, transition, named):
     obj, channels = marker(app)
     before, seen = trajectory(app)
-    app.FilterApplyFIR(obj, channels["X"], "XYZ", False, taps, cutoff, rate, transition)
+    app.FilterApplyFIR(obj, channels[named], "XYZ", False, taps, cutoff, rate, transition)
     after, still_seen = trajectory(app)
     kernel = fir(taps, cutoff, rate or 100, transition)
     for axis in range(3):
