@@ -1,10 +1,11 @@
-"""Jobs for the batch tests, importable by name as the pool's workers need them, and the takes they
-run on."""
+"""Jobs for the batch tests, importable by name as the pool's workers need them, the takes they run
+on, and what the tests check them against: the job run serially, and the processes a batch left."""
 import os
 import time
 
 SUBJECTS = ("Alice", "Bob")
 NOT_A_FUNCTION = 42
+MARKER = "CLIENT3_BATCH_TEST"  # in the environment of the processes a test starts, with a value of its own
 
 
 def unseen(client):
@@ -73,3 +74,34 @@ def make_takes(folder, count, frames, last_as_csv=False):
             paths[-1] = paths[-1].replace(".scene", ".csv")
             client.ExportFile(paths[-1], "").check()
     return paths
+
+
+def run_serially(takes):
+    """The value of `fix` for each take, run one after the other on one application."""
+    import Client3
+    from Client3.testing import running_host
+
+    values = {}
+    with running_host(scene="empty", log=False) as host, Client3.connect(host.address, host.port) as client:
+        for take in takes:
+            if take.endswith(".csv"):
+                client.ImportFile(take, "", False).check()
+            else:
+                client.LoadFile(take).check()
+            values[take] = fix(client, take)
+    return values
+
+
+def marked_processes(marker, program=""):
+    """The live processes whose environment carries `marker` as MARKER (what was started under it),
+    those of `program` alone when it is given."""
+    import psutil
+
+    found = []
+    for process in psutil.process_iter():
+        try:
+            if process.environ().get(MARKER) == marker and process.name().startswith(program):
+                found.append(process)
+        except (psutil.Error, OSError):
+            continue
+    return found

@@ -49,6 +49,7 @@ class Seen:
     """A file as the independent reader sees it; coordinates in millimetres."""
     labels: list
     rate: float
+    first_frame: int
     xyz: np.ndarray        # frames x points x 3
     e: np.ndarray          # frames x points: seen
     analog: np.ndarray     # frames x channels x samples a frame, after the file's scaling
@@ -108,7 +109,8 @@ def independent(path, strict=False):
               for name, group in reader.group_items() if name not in OWN_GROUPS}
     channels = int(reader.analog_used)
     analog = np.array(analog).reshape(len(points), channels, -1) if channels else np.zeros((len(points), 0, 0))
-    return Seen(labels=_texts(reader, "POINT:LABELS")[:n], rate=float(reader.point_rate), xyz=points[:, :, :3] * factor,
+    return Seen(labels=_texts(reader, "POINT:LABELS")[:n], rate=float(reader.point_rate), first_frame=reader.first_frame,
+                xyz=points[:, :, :3] * factor,
                 e=e, analog=analog, analog_labels=_texts(reader, "ANALOG:LABELS")[:channels],
                 analog_units=_texts(reader, "ANALOG:UNITS")[:channels], analog_rate=float(reader.analog_rate), groups=groups)
 

@@ -76,10 +76,17 @@ def host(tmp_path_factory):
     started.stop()
 
 
+@pytest.fixture(scope="session", autouse=True)
+def stopped_hosts():
+    """Every application that a test asked to stop has ended when the session does."""
+    yield
+    hostproc.collect()
+
+
 @pytest.fixture
 def start_host(tmp_path):
-    """Starts applications with extra options (`start_host("--fault", "garbage")`); each is stopped
-    when the test ends. Their logs are host0.log, host1.log, ... in the test's tmp_path."""
+    """Starts applications with extra options (`start_host("--fault", "garbage")`); each is asked to
+    stop when the test ends. Their logs are host0.log, host1.log, ... in the test's tmp_path."""
     started = []
 
     def start(*options):
@@ -91,7 +98,36 @@ def start_host(tmp_path):
 
     yield start
     for each in started:
-        each.stop()
+        hostproc.stop_later(each)
+
+
+@pytest.fixture
+def clients():
+    """Makes clients (hostproc.Client), connected (with address options) to a host when one is given;
+    each is deleted after the test."""
+    made = []
+
+    def make(host=None, options=""):
+        made.append(hostproc.Client(host, options))
+        return made[-1]
+
+    yield make
+    for client in made:
+        client.close()
+
+
+@pytest.fixture
+def frames():
+    """The take length of `app`'s demo scene; a test module that wants another overrides it."""
+    return 1000
+
+
+@pytest.fixture
+def app(start_host, frames):
+    """A client of a demo application of the test's own."""
+    client = hostproc.Client(start_host("--frames", str(frames)))
+    yield client
+    client.close()
 
 
 @pytest.fixture

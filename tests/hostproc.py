@@ -1,17 +1,34 @@
-"""Starting and stopping the application, client3-host, for the tests that talk to it.
+"""The application, client3-host, for the tests: starting and stopping it, and talking to it, through
+the module (a client whose operations answer with their record's fields) or byte by byte on the wire.
 
 A host is started on the loopback address with --port 0; its port is read from the first line it
 prints ("listening on 127.0.0.1:PORT") and its log (standard error) goes to a file."""
 import os
+import re
 import selectors
 import shutil
 import signal
+import socket
+import struct
 import subprocess
 import sysconfig
 import time
 
+import _Client3 as m
+from Client3 import _catalogue
+
+import companion
+
 ADDRESS = "127.0.0.1"
 NAME = "client3-host"
+# Every command of the application in the order of their numbers on the wire, with its inputs and outputs.
+COMMANDS = {name: (inputs, outputs) for name, _, inputs, outputs in _catalogue.COMMANDS}
+NUMBERS = {name: number for number, name in enumerate(COMMANDS)}
+MAX_FRAME = 64 << 20  # the most a frame may hold, unless --max-frame says otherwise
+NOT_CONNECTED = "Unable to communicate with the host application."
+
+
+# ---- The process --------------------------------------------------------------------------------
 
 
 def tool_environment():
@@ -28,7 +45,7 @@ def executable():
     return shutil.which(NAME)
 
 
-def _first_line(stream, deadline):
+def first_line(stream, deadline):
     """Reads the first line of `stream` (a pipe) without waiting past `deadline`."""
     line = b""
     with selectors.DefaultSelector() as selector:
@@ -42,6 +59,16 @@ def _first_line(stream, deadline):
                 break
             line += chunk
     return line.decode(errors="replace").strip()
+
+
+def wait_until(condition, seconds=5.0):
+    """Asks `condition` every 20 ms until it holds, for at most `seconds`; whether it came to hold."""
+    deadline = time.monotonic() + seconds
+    while not condition():
+        if time.monotonic() > deadline:
+            return False
+        time.sleep(0.02)
+    return True
 
 
 class Host:
@@ -83,18 +110,210 @@ class Host:
         return self.stop(signal.SIGKILL)
 
 
-def start(*options, log_path, timeout=10):
-    """Starts the application with `options` on a port the system picks; returns its Host."""
-    program = executable()
-    if not program:
+# Hosts asked to stop whose end is collected later: an application that has served a client takes a
+# tenth of a second to stop, which a test need not wait for.
+_stopping = []
+
+
+def stop_later(host):
+    """Asks `host` to stop; `collect` waits for it."""
+    host.send(signal.SIGTERM)
+    _stopping.append(host)
+
+
+def collect(ended_only=False):
+    """Waits for the hosts asked to stop (killing those that do not stop in time), or collects only
+    those that have ended."""
+    for host in list(_stopping):
+        if not ended_only or not host.running():
+            host.stop()
+            _stopping.remove(host)
+
+
+def start(*options, log_path, timeout=10, command=None, env=None):
+    """Starts the application with `options` on a port the system picks; returns its Host. `command`
+    runs another build of it (the Windows one under Wine), with the environment `env`."""
+    collect(ended_only=True)
+    command = command or [executable()]
+    if not command[0]:
         raise RuntimeError(f"{NAME} is not installed: install the project with 'pip install .'")
     with open(log_path, "wb") as log:
-        process = subprocess.Popen([program, "--host", ADDRESS, "--port", "0", *options],
+        process = subprocess.Popen([*command, "--host", ADDRESS, "--port", "0", *options], env=env,
                                    stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=log)
-    line = _first_line(process.stdout, time.monotonic() + timeout)
+    line = first_line(process.stdout, time.monotonic() + timeout)
     prefix = f"listening on {ADDRESS}:"
     if not line.startswith(prefix):
         host = Host(process, None, log_path)
         host.kill()
         raise RuntimeError(f"{NAME} {' '.join(options)} did not start: {line!r}; its log: {host.log()!r}")
     return Host(process, int(line[len(prefix):]), log_path)
+
+
+def _tcp_connections():
+    """This machine's TCP connections (Linux's /proc/net/tcp): (local port, remote port, state, bytes unread)."""
+    with open("/proc/net/tcp") as table:
+        rows = [line.split() for line in table.readlines()[1:]]
+    return [(int(row[1].split(":")[1], 16), int(row[2].split(":")[1], 16), row[3], int(row[4].split(":")[1], 16))
+            for row in rows]
+
+
+def unread_bytes(port):
+    """The bytes that wait unread in this machine's connections to `port` (Linux only)."""
+    return sum(unread for _, remote, _, unread in _tcp_connections() if remote == port)
+
+
+def connections_of(port):
+    """The connections that `port` of this machine holds, listening aside (Linux only)."""
+    return sum(1 for local, _, state, _ in _tcp_connections() if local == port and state != "0A")
+
+
+# ---- Through the module -------------------------------------------------------------------------
+
+
+def address(host, options=""):
+    """The host's address as Connect takes it, with its options."""
+    return host.address + ("?" + options if options else "")
+
+
+class ApplicationError(AssertionError):
+    """An operation that the application refused: its result code and message."""
+
+    def __init__(self, code, text):
+        super().__init__(f"{code}: {text}")
+        self.code, self.text = code, text
+
+
+def parameters(vector):
+    """The name and value pairs of a parameter vector, read through the text of a command description
+    whose inputs are set to it (the vector has no functions of its own)."""
+    sheet = m.ZarvoPelluxPostClient_GetCommandInfo(None, "")
+    m.Output_GetCommandInfo_InputParameters_set(sheet, vector)
+    text = m.Output_GetCommandInfo_DefaultOutputString(sheet)
+    lines = text.split("Input Parameters\n----------------\n", 1)[1].split("-----------------\n", 1)[0].splitlines()
+    return [] if lines == ["None"] else [re.fullmatch(r"(\S+) *(.*)", line).groups() for line in lines]
+
+
+def plain(value, kind=None):
+    """A field's value as plain Python: text as str, vectors as lists, parameters as (name, value) pairs."""
+    if kind == "Params":
+        return parameters(value)
+    name = type(value).__name__
+    if name == "SafeString":
+        return m.SafeString_Value(value)
+    if name.startswith("vector"):
+        size, item = getattr(m, name + "___len__"), getattr(m, name + "___getitem__")
+        return [plain(item(value, i)) for i in range(size(value))]
+    return value
+
+
+class Client:
+    """A client of the library through the module's functions, connected to `host` when one is given.
+    `client.Op(args)` runs Op and answers its record's outputs as plain values (one alone, several as a
+    tuple, in the order the command declares them), or its plain answer; a refusal raises
+    ApplicationError. `client.result("Op", args)` answers the code and message of Op's record, and
+    `client.record("Op", args)` the record itself."""
+
+    def __init__(self, host=None, options=""):
+        self.proxy = companion.classes["ZarvoPelluxPostClient"]()
+        if host is not None:
+            self.Connect(address(host, options), host.port)
+
+    def record(self, operation, *args):
+        return getattr(m, "ZarvoPelluxPostClient_" + operation)(self.proxy, *args)
+
+    def result(self, operation, *args):
+        record = self.record(operation, *args)
+        return m.Output_Result_Result_get(record), m.SafeString_Value(m.Output_Result_ResultString_get(record))
+
+    def _run(self, operation, *args):
+        record = self.record(operation, *args)
+        kind = type(record).__name__
+        if not kind.startswith("Output_"):
+            return record
+        code = m.Output_Result_Result_get(record)
+        if code != m.Success:
+            raise ApplicationError(code, m.SafeString_Value(m.Output_Result_ResultString_get(record)))
+        outputs = [(name, type_) for name, type_ in COMMANDS.get(operation, ((), ()))[1] if hasattr(m, f"{kind}_{name}_get")]
+        values = [plain(getattr(m, f"{kind}_{name}_get")(record), type_) for name, type_ in outputs]
+        return values[0] if len(values) == 1 else tuple(values) if values else None
+
+    def scene_file(self, path):
+        """The scene as its file's bytes, saved to `path`: two such reads tell whether it changed."""
+        self.SaveFile(str(path), "")
+        return path.read_bytes()
+
+    def __getattr__(self, operation):
+        return lambda *args: self._run(operation, *args)
+
+    def close(self):
+        m.delete_ZarvoPelluxPostClient(self.proxy)
+
+
+# ---- On the wire --------------------------------------------------------------------------------
+
+
+def frame(payload):
+    return struct.pack("<I", len(payload)) + payload
+
+
+def hello(version=1, count=len(COMMANDS), token=b""):
+    return frame(b"HZPP1" + struct.pack("<HHI", version, count, len(token)) + token)
+
+
+def text_value(text):
+    data = text.encode()
+    return b"\x01" + struct.pack("<I", len(data)) + data
+
+
+def int_value(number):
+    return b"\x02" + struct.pack("<i", number)
+
+
+def request(number, command, *inputs):
+    """A request frame for `command`, by name or by number."""
+    command = NUMBERS.get(command, command)
+    return frame(b"Q" + struct.pack("<IH", number, command) + b"".join(inputs))
+
+
+def receive(sock, size):
+    data = b""
+    while len(data) < size:
+        chunk = sock.recv(size - len(data))
+        if not chunk:
+            return None
+        data += chunk
+    return data
+
+
+def read_frame(sock):
+    """The next frame's payload, or None when the application closed the connection."""
+    header = receive(sock, 4)
+    return header and receive(sock, struct.unpack("<I", header)[0])
+
+
+def reply(payload):
+    """A reply's request number, code and message."""
+    assert payload[:1] == b"R"
+    number, code, size = struct.unpack_from("<IiI", payload, 1)
+    return number, code, payload[13:13 + size].decode()
+
+
+def refusal(payload):
+    """The text of the refusal the application sends before it closes a connection."""
+    assert payload[:1] == b"E"
+    return payload[5:5 + struct.unpack_from("<I", payload, 1)[0]].decode()
+
+
+def raw_connection(host):
+    return socket.create_connection((host.address, host.port), timeout=5)
+
+
+def shake_hands(sock):
+    sock.sendall(hello())
+    assert read_frame(sock) == b"H" + struct.pack("<HH", 1, len(COMMANDS))
+
+
+def close_with_reset(sock):
+    """Closes `sock` so that its end resets the connection rather than ending it."""
+    sock.setsockopt(socket.SOL_SOCKET, socket.SO_LINGER, struct.pack("ii", 1, 0))
+    sock.close()

@@ -13,11 +13,9 @@ import uuid
 import psutil
 import pytest
 
-import Client3
 import batchjobs
 import companion
 from Client3 import batch
-from Client3.testing import running_host
 
 distributed = pytest.importorskip("distributed")
 
@@ -27,20 +25,12 @@ TAKES = 6
 WAIT = 60  # seconds any one process may take to start, finish or stop
 CLOSE = 20  # seconds a cluster may take to close (it takes one or two)
 KILLING = ("--fault", "exit=2@OfflineFixOcclusion")  # every application ends at its second fix
-MARKER = "CLIENT3_BATCH_TEST"
 
 
 @pytest.fixture(scope="module", autouse=True)
 def package_classes(registered_classes):
     with companion.package_classes():
         yield
-
-
-def open_take(client, path):
-    if path.endswith(".csv"):
-        client.ImportFile(path, "", False).check()
-    else:
-        client.LoadFile(path).check()
 
 
 @pytest.fixture(scope="module")
@@ -52,12 +42,7 @@ def takes(tmp_path_factory):
 @pytest.fixture(scope="module")
 def serial(takes):
     """The job's value for each take, run one after the other on one application."""
-    values = {}
-    with running_host(scene="empty", log=False) as host, Client3.connect(host.address, host.port) as client:
-        for take in takes:
-            open_take(client, take)
-            values[take] = batchjobs.fix(client, take)
-    return values
+    return batchjobs.run_serially(takes)
 
 
 @pytest.fixture(scope="module")
@@ -102,19 +87,6 @@ def by_take(results):
     return found
 
 
-def marked_processes(marker, program=""):
-    """The live processes whose environment carries `marker` (what was started under it), those of
-    `program` alone when it is given."""
-    found = []
-    for process in psutil.process_iter():
-        try:
-            if process.environ().get(MARKER) == marker and process.name().startswith(program):
-                found.append(process)
-        except (psutil.Error, OSError):
-            continue
-    return found
-
-
 def test_results_equal_the_job_run_serially(engine, takes, serial):
     results = by_take(batch.run(batchjobs.fix, [*takes, takes[0]], **engine))
     assert {take: result.value for take, result in results.items()} == serial
@@ -147,10 +119,11 @@ def test_an_application_that_ends_during_a_take_is_started_again(engine, takes, 
     assert all(result.ok for result in results.values()) == (retries == 1)
 
 
-@pytest.mark.parametrize("retries", [1, 0])
+# Dask retries a take whose worker ended a number of times of its own, whatever `retries` says.
+@pytest.mark.parametrize("engine, retries", [("pool", 1), ("pool", 0), ("dask", 0)], indirect=["engine"])
 def test_a_worker_process_that_ends_loses_no_take(engine, takes, serial, tmp_path, monkeypatch, retries):
     marker = uuid.uuid4().hex
-    monkeypatch.setenv(MARKER, marker)  # seen by the pool's workers (Dask's were started before)
+    monkeypatch.setenv(batchjobs.MARKER, marker)  # seen by the pool's workers (Dask's were started before)
     # The takes share a folder of their own, where the bad one waits for another to run.
     copies = {str(shutil.copy(take, tmp_path)): take for take in takes}
     bad = str(tmp_path / "bad.scene")
@@ -164,7 +137,7 @@ def test_a_worker_process_that_ends_loses_no_take(engine, takes, serial, tmp_pat
         assert results[bad].value == "the worker process ended during the take"
         assert results[bad].attempts == retries + 1
         # The applications of the workers that ended went with them.
-        assert psutil.wait_procs(marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
+        assert psutil.wait_procs(batchjobs.marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
     else:  # Dask gives up on the take itself, after its own number of tries
         assert results[bad].value.startswith("KilledWorker: ")
 
@@ -221,19 +194,19 @@ def test_an_interrupted_batch_resumes_where_it_stopped(engine, takes, serial, tm
 
 def test_the_pools_applications_end_with_the_batch(takes, monkeypatch):
     marker = uuid.uuid4().hex
-    monkeypatch.setenv(MARKER, marker)
+    monkeypatch.setenv(batchjobs.MARKER, marker)
     assert len(list(batch.run(batchjobs.fix, takes, workers=2))) == TAKES
-    assert psutil.wait_procs(marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
+    assert psutil.wait_procs(batchjobs.marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
 
 
 def test_a_dask_workers_applications_end_with_the_worker(takes, monkeypatch):
     marker = uuid.uuid4().hex
-    monkeypatch.setenv(MARKER, marker)
+    monkeypatch.setenv(batchjobs.MARKER, marker)
     with distributed.LocalCluster(n_workers=1, threads_per_worker=2, processes=True, host="127.0.0.1", dashboard_address="127.0.0.1:0") as cluster:
         results = list(batch.run(batchjobs.fix, takes, cluster=cluster.scheduler_address))
         assert len(results) == TAKES
-        assert marked_processes(marker, "client3-host")
-    assert psutil.wait_procs(marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
+        assert batchjobs.marked_processes(marker, "client3-host")
+    assert psutil.wait_procs(batchjobs.marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
 
 
 # --- the command line -------------------------------------------------------------------------------
@@ -260,12 +233,6 @@ def test_the_command_line_exits_with_its_status_and_a_summary(takes, tmp_path, j
     assert done.stderr == "".join(f"failed: {path}: ValueError: refusing bad.scene\n" for path in extra)
 
 
-def test_the_command_line_runs_on_a_dask_cluster(takes, dask_cluster):
-    done = command("batchjobs:fix", *takes, "--cluster", dask_cluster.scheduler.address, "--retries", "0")
-    assert done.returncode == 0, done.stderr
-    assert done.stdout.startswith(f"done {TAKES}, failed 0, retried 0, "), done.stdout
-
-
 @pytest.mark.parametrize("arguments, message", [
     (["nosuchmodule:fix", "x.scene"], "cannot import nosuchmodule:fix: ModuleNotFoundError: No module named 'nosuchmodule'"),
     (["batchjobs:nothing", "x.scene"], "cannot import batchjobs:nothing: AttributeError: module 'batchjobs' has no attribute 'nothing'"),
@@ -287,7 +254,7 @@ def test_ctrl_c_stops_workers_and_applications_and_the_batch_resumes(takes, tmp_
     out = tmp_path / "out.jsonl"
     three = takes[:3]  # two workers: once two takes are done, one runs the third and the other waits
     arguments = [sys.executable, "-m", "Client3.batch", "batchjobs:slow", *three, "--workers", "2", "--out", str(out)]
-    environment = dict(os.environ, **{MARKER: marker})
+    environment = dict(os.environ, **{batchjobs.MARKER: marker})
     process = subprocess.Popen(arguments, cwd=HERE, env=environment, stdout=subprocess.PIPE, stderr=subprocess.PIPE,
                                text=True, start_new_session=True)
     try:
@@ -303,7 +270,7 @@ def test_ctrl_c_stops_workers_and_applications_and_the_batch_resumes(takes, tmp_
     assert process.returncode == 130, stderr
     assert stdout.endswith(" (interrupted)\n"), stdout
     assert stderr == "", stderr
-    assert psutil.wait_procs(marked_processes(marker), timeout=WAIT)[1] == []
+    assert psutil.wait_procs(batchjobs.marked_processes(marker), timeout=WAIT)[1] == []
     first = [line["take"] for line in lines(out)]
     assert len(first) == 2
     done = command("batchjobs:fix", *three, "--out", str(out), "--resume")

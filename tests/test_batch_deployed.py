@@ -20,13 +20,11 @@ import Client3
 import Client3.batch
 import batchjobs
 import companion
-from Client3.testing import running_host
 
 distributed = pytest.importorskip("distributed")
 
 WAIT = 60  # seconds a process may take to start or stop
 TAKES = 4
-MARKER = "CLIENT3_DEPLOYED_TEST"  # in the environment of every process the tests start
 
 # The batch as a user's script runs it: `python script.py ADDRESS TAKE...`, one JSON line per take.
 SCRIPT = '''
@@ -58,18 +56,7 @@ def environment(marker, **extra):
     """This process's environment without any PYTHONPATH of its own (the user's folders are on no
     path), marked so that what is started under it can be found."""
     env = {key: value for key, value in os.environ.items() if key != "PYTHONPATH"}
-    return dict(env, **{MARKER: marker}, **extra)
-
-
-def marked_processes(marker):
-    found = []
-    for process in psutil.process_iter():
-        try:
-            if process.environ().get(MARKER) == marker:
-                found.append(process)
-        except (psutil.Error, OSError):
-            continue
-    return found
+    return dict(env, **{batchjobs.MARKER: marker}, **extra)
 
 
 def stop(processes):
@@ -129,7 +116,7 @@ class Deployed:
             stop([psutil.Process(p.pid) for p in group if p.poll() is None])
         for process in self.processes:
             process.wait()
-        left = psutil.wait_procs(marked_processes(self.marker), timeout=WAIT)[1]
+        left = psutil.wait_procs(batchjobs.marked_processes(self.marker), timeout=WAIT)[1]
         stop(left)
         return left
 
@@ -148,12 +135,7 @@ def user(tmp_path_factory):
 @pytest.fixture(scope="module")
 def serial(user):
     """The job's value for each take, run here one take after the other."""
-    values = {}
-    with running_host(scene="empty", log=False) as host, Client3.connect(host.address, host.port) as client:
-        for take in takes_of(user):
-            client.LoadFile(take).check()
-            values[take] = batchjobs.fix(client, take)
-    return values
+    return batchjobs.run_serially(takes_of(user))
 
 
 @pytest.fixture(scope="module")

@@ -12,7 +12,7 @@ import numpy as np
 import pytest
 
 import hostproc
-from appclient import Client
+from hostproc import Client
 from c3dfiles import CORPUS, analog_names, build, independent, point_names
 
 DAMAGED = "sample_18_bad_parameter_section.c3d"
@@ -153,7 +153,7 @@ def test_the_damaged_file_is_refused_in_printable_words(app):
     import_take(app, CORPUS / "sample_30_admarche2.c3d")
     before = (app.GetSceneName(), app.GetFrameCount(), analog_objects(app))
     for merge in (False, True):
-        code, message = app.refusal("ImportFile", str(CORPUS / DAMAGED), "", merge)
+        code, message = app.result("ImportFile", str(CORPUS / DAMAGED), "", merge)
         assert code == m.ApplicationError
         assert message.startswith("the C3D file is damaged: ") and message.isprintable() and message.isascii()
     assert (app.GetSceneName(), app.GetFrameCount(), analog_objects(app)) == before
@@ -175,7 +175,7 @@ def test_a_rate_that_is_not_a_whole_number_is_kept_with_exact_ticks(app, name):
         assert app.TimelineGetTicks() == ticks_of(frame, rate)
         app.TimelineSetTicks(ticks_of(frame, rate) - (frame > 1))
         assert app.TimelineGetFrames() == frame - (frame > 1)
-    assert app.refusal("TimelineSetTicks", ticks_of(frames + 1, rate))[0] == m.InvalidFrameNumber
+    assert app.result("TimelineSetTicks", ticks_of(frames + 1, rate))[0] == m.InvalidFrameNumber
     app.TimelineSetTicks(ticks_of(frames + 1, rate) - 1)
     assert app.TimelineGetFrames() == frames
 
@@ -208,7 +208,7 @@ def test_a_damaged_scene_file_with_analog_channels_is_refused(app, tmp_path, dam
     import_take(app, CORPUS / "sample_07_16bitanalog.c3d")
     app.SaveFile(str(tmp_path / "good.scene"), "")
     (tmp_path / "bad.scene").write_text(damage((tmp_path / "good.scene").read_text()))
-    code, message = app.refusal("LoadFile", str(tmp_path / "bad.scene"))
+    code, message = app.result("LoadFile", str(tmp_path / "bad.scene"))
     assert code == m.ApplicationError and message.startswith("the scene file is damaged at line ") and message.endswith(why)
 
 
@@ -228,7 +228,7 @@ def test_scripts_rename_and_describe_analog_channels(app, tmp_path):
     channel = app.SceneGetObject("/el-0")[0]
     app.ObjectSetAttributeValue(channel, "Name", "Left soleus")
     app.ObjectSetAttributeValue(channel, "Unit", "mV")
-    assert app.refusal("ObjectSetAttributeValue", channel, "Scale", "2") == (
+    assert app.result("ObjectSetAttributeValue", channel, "Scale", "2") == (
         m.ApplicationError, f"attribute 'Scale' of object {channel} is read-only")
     app.TimelineSetFrameRate(100.0)
     assert app.ObjectGetAttributeValue(channel, "Rate")[2] == "100"
@@ -239,7 +239,7 @@ def test_scripts_rename_and_describe_analog_channels(app, tmp_path):
 
 def test_analog_objects_cannot_be_made_by_scripts(app):
     root = app.SceneGetObject("/")[0]
-    assert app.refusal("SceneCreateObject", "Analog", "EMG", root, "") == (
+    assert app.result("SceneCreateObject", "Analog", "EMG", root, "") == (
         m.ApplicationError, "an Analog object comes only with the analog channels of an imported C3D file")
 
 

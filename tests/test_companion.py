@@ -71,12 +71,13 @@ def test_registration_happens_once_at_import():
     assert out.split() == ["46", "1"]
 
 
-@pytest.mark.parametrize("name", [n for n, m in Client3.TABLE.items() if m.constructible and n not in Client3.VECTORS])
-def test_constructed_objects_are_instances_and_are_destroyed_without_a_leak(name):
-    code = f"import Client3\nobject = Client3.{name}()\nprint(type(object).__name__, object.this.own())\ndel object\nprint('gone')\n"
+def test_constructed_objects_are_instances_and_are_destroyed_without_a_leak():
+    names = [name for name, members in Client3.TABLE.items() if members.constructible and name not in Client3.VECTORS]
+    code = (f"import Client3\nfor name in {names!r}:\n"
+            "    made = getattr(Client3, name)()\n    print(type(made).__name__, made.this.own())\n    del made\n")
     status, out, err = run_python(code)
-    assert status == 0, err
-    assert out.split() == [name, "True", "gone"]
+    assert (status, err) == (0, "")
+    assert out.splitlines() == [f"{name} True" for name in names]
 
 
 def test_types_without_a_constructor_refuse_construction():
@@ -91,10 +92,6 @@ SAMPLES = {
     "vectori": [3, -1, 4, 1, -5],
     "vectorull": [2**64 - 1, 0, 7, 2**40, 1],
 }
-
-
-def elements(vector):
-    return list(vector)
 
 
 def operations(values):
@@ -126,10 +123,10 @@ def test_vector_follows_a_list(name):
     for step, operation in operations(values):
         result, expected = operation(vector), operation(model)
         assert result == expected and type(result) is type(expected), step
-        assert elements(vector) == model, step
+        assert list(vector) == model, step
         assert len(vector) == len(model), step
-    assert elements(vector[::-1]) == model[::-1]
-    assert elements(reversed(vector)) == model[::-1]
+    assert list(vector[::-1]) == model[::-1]
+    assert list(reversed(vector)) == model[::-1]
     assert [v == m for v, m in zip(vector, model)] == [True] * len(model)
     assert vector[-1] == model[-1] and vector[0] == model[0]
     assert model[0] in vector and vector == model and vector == Client3.classes[name](model)
@@ -211,36 +208,10 @@ with Client3.connect({host.address!r}, {host.port}) as client:
     assert (code, out) == (0, "1003 no subject named ''\n"), err
 
 
-def test_results_and_errors(client):
-    good = client.GetMarkerNames("Alice")
-    bad = client.GetMarkerNames("Carol")
-    assert good.ok and good.check() is good
-    assert not bad.ok
-    with pytest.raises(Client3.Error) as caught:
-        bad.check()
-    assert caught.value.code == Client3.ApplicationError
-    assert "Carol" in caught.value.text and "Carol" in str(caught.value)
-
-
-def test_connect_refused_raises_the_result_code():
-    with running_host(log=False) as gone:
-        pass
-    with pytest.raises(Client3.Error) as caught:
-        Client3.connect(gone.address, gone.port)
-    assert caught.value.code == Client3.NotConnected
-
-
 def test_client_disconnects_at_the_end_of_with(host):
     with Client3.connect(host.address, host.port) as client:
         assert client.IsConnected()
     assert not client.IsConnected()
-
-
-def test_trajectory_written_is_read_back(client):
-    frame = client.GetTrajectoryAtFrame("Bob", "C7", 5).check()
-    assert client.SetTrajectoryAtFrame("Bob", "C7", 5, 1.0, 2.0, 3.0, True).ok
-    assert client.GetTrajectoryAtFrame("Bob", "C7", 5).X == 1.0
-    client.SetTrajectoryAtFrame("Bob", "C7", 5, frame.X, frame.Y, frame.Z, frame.E).check()
 
 
 @pytest.mark.parametrize("scene, frames, subjects", [("demo", 50, ["Alice", "Bob"]), ("empty", 20, [])])

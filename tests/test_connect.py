@@ -7,7 +7,7 @@ import sys
 import pytest
 
 import _Client3 as m
-import companion
+from hostproc import Client
 
 TOKEN = "correct horse"
 # No resolver sends this name anywhere: a label has at most 63 octets.
@@ -16,13 +16,11 @@ TOO_LONG_A_LABEL = "x" * 64 + ".invalid"
 
 def attempt(address, port):
     """The code and text of a new client's Connect, and whether the client is connected after it."""
-    client = companion.classes["ZarvoPelluxPostClient"]()
+    client = Client()
     try:
-        record = m.ZarvoPelluxPostClient_Connect(client, address, port)
-        return (m.Output_Result_Result_get(record), m.SafeString_Value(m.Output_Result_ResultString_get(record)),
-                m.ZarvoPelluxPostClient_IsConnected(client))
+        return (*client.result("Connect", address, port), client.IsConnected())
     finally:
-        m.delete_ZarvoPelluxPostClient(client)
+        client.close()
 
 
 # ---- Places to connect to: each gives a host and a port; what it opens is closed after the test ----
@@ -69,9 +67,7 @@ def host_with_token(start_host, stack):
 
 def full_host(start_host, stack):
     host = start_host("--max-clients", "1")
-    client = companion.classes["ZarvoPelluxPostClient"]()
-    stack.callback(m.delete_ZarvoPelluxPostClient, client)
-    assert m.Output_Result_Result_get(m.ZarvoPelluxPostClient_Connect(client, host.address, host.port)) == m.Success
+    stack.callback(Client(host).close)  # the one client it serves
     return host.address, host.port
 
 

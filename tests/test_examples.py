@@ -47,20 +47,18 @@ def test_session_reports_an_unknown_marker(tmp_path):
 
 
 @pytest.mark.parametrize("example, expected", [
-    ("numpy_trajectories.py", "Alice  RWRA    920 frames seen, mean speed 1.18 m/s"),
-    ("write_trajectory.py", "Alice's RWRA: 80 frames unseen before, 0 after"),
-    ("process_request.py", "ReleaseType    Release"),
-    ("process_request.py", "Value=1680"),
-    ("batch.py", "take12.scene       9       8     1"),
-    ("batch.py", "take13.scene       9       7     2"),
+    ("numpy_trajectories.py", ["Alice  RWRA    920 frames seen, mean speed 1.18 m/s"]),
+    ("write_trajectory.py", ["Alice's RWRA: 80 frames unseen before, 0 after"]),
+    ("process_request.py", ["ReleaseType    Release", "Value=1680"]),
+    ("batch.py", ["take12.scene       9       8     1", "take13.scene       9       7     2"]),
 ])
 def test_example_runs_against_its_own_application(tmp_path, example, expected):
     done = run(os.path.join(ROOT, "examples", example), cwd=tmp_path)
     assert done.returncode == 0, done.stderr
-    assert expected in done.stdout.splitlines()
+    for line in expected:
+        assert line in done.stdout.splitlines()
 
 
-@pytest.mark.parametrize("example", EXAMPLES, ids=os.path.basename)
-def test_examples_pass_a_strict_type_check(example):
-    done = run("-m", "mypy", "--strict", "--no-incremental", example, cwd=ROOT)
+def test_examples_pass_a_strict_type_check():
+    done = run("-m", "mypy", "--strict", "--no-incremental", *EXAMPLES, cwd=ROOT)
     assert done.returncode == 0, done.stdout

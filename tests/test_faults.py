@@ -5,51 +5,45 @@ import os
 import signal
 import subprocess
 import sys
-import time
 
 import _Client3 as m
-import pytest
 
-import companion
-from appclient import Client
+from hostproc import Client, wait_until
 
 # Long enough a take that saving it takes a good part of a second.
 FRAMES = "40000"
 
 
 def kill_later(pid, seconds):
-    """A process that kills `pid` after `seconds` (the calling thread may be blocked in the module)."""
+    """A process that kills `pid` after `seconds`, while the calling thread is blocked in the module
+    waiting for a reply that the host delays for longer."""
     code = f"import os, signal, time; time.sleep({seconds}); os.kill({pid}, signal.SIGKILL)"
     return subprocess.Popen([sys.executable, "-c", code])
 
 
 def test_host_killed_mid_request_then_restarted(start_host):
     host = start_host("--fault", "delay=5000@GetTrajectory")
-    client = companion.classes["ZarvoPelluxPostClient"]()
-    address = host.address + "?timeout=20000"
-    assert m.Output_Result_Result_get(m.ZarvoPelluxPostClient_Connect(client, address, host.port)) == m.Success
+    client = Client(host, "timeout=20000")
     killer = kill_later(host.process.pid, 0.5)
-    record = m.ZarvoPelluxPostClient_GetTrajectory(client, "Alice", "LANK")
     # Seen gone when the connection broke, not when the reply timeout ran out (RequestTimedOut).
-    assert m.Output_Result_Result_get(record) == m.NotConnected
-    assert m.ZarvoPelluxPostClient_IsConnected(client) is False
+    assert client.result("GetTrajectory", "Alice", "LANK")[0] == m.NotConnected
+    assert client.IsConnected() is False
     assert killer.wait(10) == 0
     assert host.process.wait(10) == -signal.SIGKILL
 
     again = start_host("--port", str(host.port))
     assert again.port == host.port
-    assert m.Output_Result_Result_get(m.ZarvoPelluxPostClient_Connect(client, address, again.port)) == m.Success
-    assert m.ZarvoPelluxPostClient_GetFrameCount(client) == 1000
-    m.delete_ZarvoPelluxPostClient(client)
+    client.Connect(again.address + "?timeout=20000", again.port)
+    assert client.GetFrameCount() == 1000
+    client.close()
 
 
 SAVER = """
-import sys
+import sys, types
 sys.path.insert(0, {tests!r})
 import companion
 companion.register()
-from appclient import Client
-import types
+from hostproc import Client
 client = Client(types.SimpleNamespace(address="127.0.0.1", port={port}))
 print("ready", flush=True)
 client.SetSceneName({name!r})
@@ -70,15 +64,19 @@ def saved_take(start_host, tmp_path):
     return host, app, files, path, reference
 
 
-@pytest.mark.parametrize("delay", [0.1, 0.4])
-def test_client_killed_mid_save(start_host, tmp_path, delay):
+def folder_state(folder):
+    """Each file of `folder` by name, size and time of change."""
+    return sorted((entry.name, entry.stat().st_size, entry.stat().st_mtime_ns) for entry in os.scandir(folder))
+
+
+def test_client_killed_mid_save(start_host, tmp_path):
     host, app, files, path, reference = saved_take(start_host, tmp_path)
-    old = path.read_bytes()
-    saver = subprocess.Popen([sys.executable, "-c", SAVER.format(tests=os.path.dirname(companion.__file__),
-                                                                  port=host.port, name="Saved by a client", path=str(path))],
-                             stdout=subprocess.PIPE, text=True)
+    old, before = path.read_bytes(), folder_state(files)
+    script = SAVER.format(tests=os.path.dirname(__file__), port=host.port, name="Saved by a client", path=str(path))
+    saver = subprocess.Popen([sys.executable, "-c", script], stdout=subprocess.PIPE, text=True)
     assert saver.stdout.readline() == "ready\n"
-    time.sleep(delay)
+    # Killed as soon as the host begins to write the file.
+    assert wait_until(lambda: folder_state(files) != before, seconds=30)
     saver.kill()
     saver.communicate(timeout=30)
     # The next command waits for the saver's to end: the host finishes what it began.
@@ -116,7 +114,7 @@ def test_host_killed_as_it_begins_to_write(start_host, tmp_path):
     killer = subprocess.Popen([sys.executable, "-c", WATCHER, str(host.process.pid), str(files)],
                               stdout=subprocess.PIPE, text=True)
     assert killer.stdout.readline() == "watching\n"
-    assert app.refusal("SaveFile", str(path), "")[0] in (m.Success, m.NotConnected)
+    assert app.result("SaveFile", str(path), "")[0] in (m.Success, m.NotConnected)
     assert killer.wait(40) == 0
     assert path.read_bytes() in (old, new)
     # A fresh host reads the file whole.

@@ -3,14 +3,10 @@ application), atomic writes, and damaged or hostile files refused with the scene
 import _Client3 as m
 import pytest
 
-from appclient import Client
-
 
 @pytest.fixture
-def app(start_host):
-    client = Client(start_host("--frames", "50"))
-    yield client
-    client.close()
+def frames():
+    return 50
 
 
 def at(app, path):
@@ -67,19 +63,17 @@ def edit(app):
     app.TimelineSelectRange(5, 9, 0)
 
 
-def test_saved_scene_loads_the_same_in_a_fresh_application(app, start_host, tmp_path):
+def test_saved_scene_loads_the_same_in_a_fresh_application(app, start_host, clients, tmp_path):
     edit(app)
     path = str(tmp_path / "walk é.c3scene")
     app.SaveFile(path, "")
     assert app.GetSceneName() == ("Edited scene", path)
     before = snapshot(app)
-    other = Client(start_host("--frames", "5"))
+    other = clients(start_host("--frames", "5"))
     other.LoadFile(path)
     assert other.GetSceneName() == ("Edited scene", path)
     assert snapshot(other) == before
-    fresh = Client(start_host("--scene", path))
-    assert snapshot(fresh) == before
-    other.close(), fresh.close()
+    assert snapshot(clients(start_host("--scene", path))) == before
 
 
 def test_new_scene_is_empty_and_keeps_the_take_length(app):
@@ -100,8 +94,8 @@ def test_saving_replaces_the_file_and_leaves_nothing_else(app, tmp_path):
 
 def test_failed_save_keeps_the_old_file(app, tmp_path):
     missing = tmp_path / "no such directory" / "scene.c3scene"
-    assert app.refusal("SaveFile", str(missing), "") == (m.ApplicationError, f"cannot write the file '{missing}'")
-    assert app.refusal("SaveFile", str(tmp_path / "s"), "Compress=yes") == (
+    assert app.result("SaveFile", str(missing), "") == (m.ApplicationError, f"cannot write the file '{missing}'")
+    assert app.result("SaveFile", str(tmp_path / "s"), "Compress=yes") == (
         m.ApplicationError, "'SaveFile' takes no options: 'Compress=yes'")
     assert app.GetSceneName() == ("Demo", "")
 
@@ -133,8 +127,8 @@ def test_damaged_files_are_refused_and_the_scene_is_kept(app, tmp_path):
     bad = tmp_path / "bad.c3scene"
     for damaged in damaged_files(text):
         bad.write_bytes(damaged.encode("utf-8", "surrogateescape"))
-        code, message = app.refusal("LoadFile", str(bad))
+        code, message = app.result("LoadFile", str(bad))
         assert code == m.ApplicationError and message.startswith("the scene file is damaged at line "), damaged[:80]
-    assert app.refusal("LoadFile", str(tmp_path / "none")) == (m.ApplicationError, f"cannot read the file '{tmp_path / 'none'}'")
-    assert app.refusal("LoadFile", str(tmp_path)) == (m.ApplicationError, f"cannot read the file '{tmp_path}'")
+    assert app.result("LoadFile", str(tmp_path / "none")) == (m.ApplicationError, f"cannot read the file '{tmp_path / 'none'}'")
+    assert app.result("LoadFile", str(tmp_path)) == (m.ApplicationError, f"cannot read the file '{tmp_path}'")
     assert snapshot(app) == before

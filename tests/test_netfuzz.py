@@ -1,29 +1,39 @@
 """A network fuzzer against a running host: random, mutated, truncated, oversized and slowly dripped
 frames, half-closed connections, clients that never read their replies, and thousands of
-connections opened and dropped. Throughout, the
-host keeps serving a well-behaved client, and its memory and thread count stay bounded. Seeded, and
-bounded in rounds and time."""
+connections opened and dropped. Throughout, the host keeps serving a well-behaved client, and its
+memory and thread count stay bounded. Seeded, and bounded in rounds and time.
+
+    python tests/test_netfuzz.py --rounds 100000 --seconds 3600 [--seed 1]   # the long run
+
+The test runs 1,000 rounds."""
+import argparse
 import os
 import random
 import socket
 import struct
+import sys
+import tempfile
 import time
 
 import _Client3 as m
 import pytest
 
-from appclient import Client
+import companion
+import hostproc
 from conftest import needs_plain_allocator
-from test_host import MAX_FRAME, frame, hello, read_frame, refusal, reply, request, text_value, wait_until
+from hostproc import (COMMANDS, MAX_FRAME, Client, close_with_reset, frame, hello, int_value, read_frame, refusal, reply,
+                      request, text_value, wait_until)
 
 SEED = 20261123
 ROUNDS = 1000
-SECONDS = 120     # the whole fuzz, at most
+SECONDS = 120     # the test's fuzz, at most
 DRIPPERS = 12     # connections that send their requests one byte a round
 HOLDERS = 12      # connections that announce the largest frame and send only part of it
 HELD_BYTES = 256 << 10
 BURST = 30        # connections opened and dropped at once
 CLIENTS = 64      # the host's default limit
+FRAMES = 1000     # the demo take's
+
 
 def host_status(host):
     """The host's resident memory in KiB and its thread count, from /proc."""
@@ -31,16 +41,13 @@ def host_status(host):
         fields = dict(line.split(":", 1) for line in status)
     return int(fields["VmRSS"].split()[0]), int(fields["Threads"])
 
-def connection(host):
-    sock = socket.create_connection((host.address, host.port), timeout=5)
-    return sock
 
-def shaken(host, commands):
+def shaken(host):
     """A connection that has shaken hands. Connections just dropped may still count against the
     host's limit of clients for a moment: a refusal for that is waited out, as a client would."""
     for _ in range(250):
-        sock = connection(host)
-        sock.sendall(hello(len(commands)))
+        sock = hostproc.raw_connection(host)
+        sock.sendall(hello())
         answer = read_frame(sock)
         if answer[:1] == b"H":
             return sock
@@ -49,36 +56,36 @@ def shaken(host, commands):
         time.sleep(0.02)
     raise AssertionError("the host stayed full")
 
-def reset_and_close(sock):
-    sock.setsockopt(socket.SOL_SOCKET, socket.SO_LINGER, struct.pack("ii", 1, 0))
-    sock.close()
 
 class Fuzzer:
     """One kind of bad peer per method; `rng` chooses what each sends."""
 
-    def __init__(self, host, commands, rng):
-        self.host, self.commands, self.rng = host, commands, rng
+    def __init__(self, host, rng):
+        self.host, self.rng = host, rng
         self.connections = 0
-        number = commands.index
         # Requests of commands that only read the scene, for mutation.
         self.requests = [
-            request(0, number("GetMarkerNames"), text_value("Alice")),
-            request(0, number("GetTrajectoryAtFrame"), text_value("Bob"), text_value("LANK"), b"\x02" + struct.pack("<i", 9)),
-            request(0, number("GetTrajectory"), text_value("Alice"), text_value("C7")),
-            request(0, number("GetSubjectNames")),
+            request(0, "GetMarkerNames", text_value("Alice")),
+            request(0, "GetTrajectoryAtFrame", text_value("Bob"), text_value("LANK"), int_value(9)),
+            request(0, "GetTrajectory", text_value("Alice"), text_value("C7")),
+            request(0, "GetSubjectNames"),
         ]
 
     def open(self, shake=True):
         self.connections += 1
-        return shaken(self.host, self.commands) if shake else connection(self.host)
+        return shaken(self.host) if shake else hostproc.raw_connection(self.host)
 
     def bytes(self, most):
         return bytes(self.rng.randrange(256) for _ in range(self.rng.randrange(1, most)))
 
+    def close(self, sock):
+        """Closes `sock`, half the time with a reset."""
+        close_with_reset(sock) if self.rng.random() < 0.5 else sock.close()
+
     def garbage_before_hello(self):
         sock = self.open(shake=False)
         sock.sendall(self.bytes(200))
-        reset_and_close(sock) if self.rng.random() < 0.5 else sock.close()
+        self.close(sock)
 
     def frame_that_is_no_request(self):
         with self.open() as sock:
@@ -105,11 +112,11 @@ class Fuzzer:
             got_number, code = struct.unpack_from("<Ii", answer, 1)
             assert got_number == number
             assert code in (m.Success, m.ApplicationError, m.InvalidFrameNumber)
-            sock.sendall(request(number + 1, self.commands.index("GetFrameCount")))
+            sock.sendall(request(number + 1, "GetFrameCount"))
             assert reply(read_frame(sock))[:2] == (number + 1, m.Success)
 
     def unknown_command(self):
-        command = self.rng.randrange(len(self.commands), 1 << 16)
+        command = self.rng.randrange(len(COMMANDS), 1 << 16)
         with self.open() as sock:
             sock.sendall(request(5, command, self.bytes(60)))
             assert reply(read_frame(sock)) == (5, m.ApplicationError, f"no command number {command}")
@@ -118,7 +125,7 @@ class Fuzzer:
         sent = self.rng.choice(self.requests)
         sock = self.open()
         sock.sendall(sent[:self.rng.randrange(1, len(sent))])
-        reset_and_close(sock) if self.rng.random() < 0.5 else sock.close()
+        self.close(sock)
 
     def oversized(self):
         size = self.rng.choice([0, MAX_FRAME + 1, self.rng.randrange(MAX_FRAME + 1, 1 << 32)])
@@ -129,7 +136,7 @@ class Fuzzer:
 
     def half_closed(self):
         with self.open() as sock:
-            sock.sendall(request(3, self.commands.index("GetMarkerNames"), text_value("Bob")))
+            sock.sendall(request(3, "GetMarkerNames", text_value("Bob")))
             sock.shutdown(socket.SHUT_WR)
             assert reply(read_frame(sock)) == (3, m.Success, "")
             assert read_frame(sock) is None
@@ -139,73 +146,74 @@ class Fuzzer:
         # the client goes.
         sock = self.open()
         sock.sendall(self.requests[2] * 60)
-        reset_and_close(sock) if self.rng.random() < 0.5 else sock.close()
+        self.close(sock)
 
     def burst(self):
         held = [self.open(shake=False) for _ in range(BURST)]
         for i, sock in enumerate(held):
             if i % 2:
-                sock.sendall(hello(len(self.commands))[:self.rng.randrange(1, 12)])
-            reset_and_close(sock) if i % 3 == 0 else sock.close()
+                sock.sendall(hello()[:self.rng.randrange(1, 12)])
+            close_with_reset(sock) if i % 3 == 0 else sock.close()
 
     KINDS = ["garbage_before_hello", "frame_that_is_no_request", "mutated_request", "unknown_command", "truncated",
              "oversized", "half_closed", "never_reads", "burst"]
 
+
 class Dripper:
     """A connection that sends requests one byte a round, and reads each reply once it is all sent."""
 
-    def __init__(self, sock, commands):
-        self.sock, self.command = sock, commands.index("GetMarkerNames")
+    def __init__(self, sock):
+        self.sock = sock
         self.number, self.left, self.answered = 0, b"", 0
 
     def drip(self):
         if not self.left:
             self.number += 1
-            self.left = request(self.number, self.command, text_value("Alice"))
+            self.left = request(self.number, "GetMarkerNames", text_value("Alice"))
         self.sock.sendall(self.left[:1])
         self.left = self.left[1:]
         if not self.left:
             assert reply(read_frame(self.sock)) == (self.number, m.Success, "")
             self.answered += 1
 
-@pytest.mark.skipif(not os.path.exists("/proc/self/status"), reason="needs /proc to read the host's memory and threads")
-@needs_plain_allocator
-def test_host_survives_the_network_fuzzer(start_host):
-    host = start_host()
+
+def fuzz(host, rounds, seconds, seed):
+    """Fuzzes `host` for `rounds` rounds (failing past `seconds`) and checks that it kept serving
+    within bounds; returns its figures."""
     well = Client(host)
-    commands = well.GetCommandList()
     markers = well.GetMarkerNames("Alice")
     rss_before, threads_before = host_status(host)
-    rng = random.Random(SEED)
-    fuzz = Fuzzer(host, commands, rng)
-    drippers = [Dripper(fuzz.open(), commands) for _ in range(DRIPPERS)]
+    rng = random.Random(seed)
+    fuzzer = Fuzzer(host, rng)
+    drippers = [Dripper(fuzzer.open()) for _ in range(DRIPPERS)]
     for i, dripper in enumerate(drippers):  # staggered, so that their frames end in different rounds
         for _ in range(i):
             dripper.drip()
-    holders = [fuzz.open() for _ in range(HOLDERS)]
+    holders = [fuzzer.open() for _ in range(HOLDERS)]
     for sock in holders:
         sock.sendall(struct.pack("<I", MAX_FRAME) + b"Q" + bytes(HELD_BYTES))
-    deadline = time.monotonic() + SECONDS
-    rss_most, threads_most = 0, 0
-    for turn in range(1, ROUNDS + 1):
-        assert time.monotonic() < deadline, f"the fuzz took longer than {SECONDS} s"
-        getattr(fuzz, rng.choice(Fuzzer.KINDS))()
+    deadline = time.monotonic() + seconds
+    rss_most, threads_most, written = 0, 0, {}
+    for turn in range(1, rounds + 1):
+        assert time.monotonic() < deadline, f"the fuzz took longer than {seconds} s"
+        getattr(fuzzer, rng.choice(Fuzzer.KINDS))()
         for dripper in drippers:
             dripper.drip()
         if turn % 20 == 0:
             # The well-behaved client is served, and sees its own writes.
-            well.SetTrajectoryAtFrame("Bob", "RANK", turn, float(turn), 0.0, 0.0, True)
-            assert well.GetTrajectoryAtFrame("Bob", "RANK", turn) == (float(turn), 0.0, 0.0, True)
+            at = (turn // 20 - 1) % FRAMES + 1
+            written[at] = float(turn)
+            well.SetTrajectoryAtFrame("Bob", "RANK", at, float(turn), 0.0, 0.0, True)
+            assert well.GetTrajectoryAtFrame("Bob", "RANK", at) == (float(turn), 0.0, 0.0, True)
             rss, threads = host_status(host)
             rss_most, threads_most = max(rss_most, rss), max(threads_most, threads)
 
-    assert sum(dripper.answered for dripper in drippers) >= DRIPPERS * (ROUNDS // 25)
-    for dripper in drippers:
-        dripper.sock.close()
-    for sock in holders:
+    answered = sum(dripper.answered for dripper in drippers)
+    assert answered >= DRIPPERS * (rounds // 25)
+    for sock in [dripper.sock for dripper in drippers] + holders:
         sock.close()
 
-    assert fuzz.connections > 2000
+    assert fuzzer.connections > 2 * rounds
     # A thread for each client, at most CLIENTS of them, besides the main thread; none left once they
     # are gone.
     assert threads_most <= CLIENTS + 1
@@ -214,8 +222,37 @@ def test_host_survives_the_network_fuzzer(start_host):
     assert rss_most - rss_before < 64 << 10
     assert well.GetMarkerNames("Alice") == markers
     x = well.GetTrajectory("Bob", "RANK")[0]
-    assert [x[turn - 1] for turn in range(20, ROUNDS + 1, 20)] == [float(t) for t in range(20, ROUNDS + 1, 20)]
-    fresh = Client(host)
-    assert fresh.GetFrameCount() == 1000
-    fresh.close()
+    assert [x[at - 1] for at in written] == list(written.values())
     well.close()
+    fresh = Client(host)
+    assert fresh.GetFrameCount() == FRAMES
+    fresh.close()
+    return {"connections": fuzzer.connections, "answered drips": answered, "most threads": threads_most,
+            "resident KiB before": rss_before, "resident KiB at most": rss_most}
+
+
+@pytest.mark.skipif(not os.path.exists("/proc/self/status"), reason="needs /proc to read the host's memory and threads")
+@needs_plain_allocator
+def test_host_survives_the_network_fuzzer(start_host):
+    fuzz(start_host(), ROUNDS, SECONDS, SEED)
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__.split("\n\n")[0])
+    parser.add_argument("--rounds", type=int, default=100_000)
+    parser.add_argument("--seconds", type=float, default=3600)
+    parser.add_argument("--seed", type=int, default=SEED)
+    options = parser.parse_args()
+    companion.register()
+    with tempfile.TemporaryDirectory() as folder:
+        host = hostproc.start(log_path=os.path.join(folder, "host.log"))
+        try:
+            figures = fuzz(host, options.rounds, options.seconds, options.seed)
+        finally:
+            host.stop()
+    print(f"{options.rounds} rounds, seed {options.seed}: " + ", ".join(f"{k} {v}" for k, v in figures.items()))
+    return 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())

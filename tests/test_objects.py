@@ -3,16 +3,7 @@ with their keys, and parameters, against real hosts. Each test changes a demo sc
 import _Client3 as m
 import pytest
 
-from appclient import ApplicationError, Client
-
 BAD = 999_999_999  # an id that names nothing
-
-
-@pytest.fixture
-def app(start_host):
-    client = Client(start_host())
-    yield client
-    client.close()
 
 
 def at(app, path):
@@ -56,7 +47,7 @@ def test_demo_scene_as_a_tree(app):
     ("ObjectSelect", (BAD, 0)), ("SceneRemoveObject", (BAD, "")), ("ChannelGetGaps", (BAD, 1, 0)), ("ParameterCreate", (BAD, "P", 1)),
 ])
 def test_an_id_that_names_nothing_is_refused_by_name(app, operation, args):
-    assert app.refusal(operation, *args) == (m.ApplicationError, f"no object with id {BAD}")
+    assert app.result(operation, *args) == (m.ApplicationError, f"no object with id {BAD}")
 
 
 def test_created_objects_get_ids_that_are_never_used_again(app):
@@ -66,7 +57,7 @@ def test_created_objects_get_ids_that_are_never_used_again(app):
     child = app.SceneCreateObject("Null", "Part", first, "")[0]
     app.SceneRemoveObject(first, "")
     for gone in (first, child):
-        assert app.refusal("ObjectGetPath", gone) == (m.ApplicationError, f"no object with id {gone}")
+        assert app.result("ObjectGetPath", gone) == (m.ApplicationError, f"no object with id {gone}")
     again = app.SceneCreateObject("Null", "Rig", root, "")[0]
     assert again > child
 
@@ -81,7 +72,7 @@ def test_created_objects_get_ids_that_are_never_used_again(app):
 ])
 def test_refused_creation_leaves_the_tree_as_it_was(app, kind, name, parent, options, message):
     before = tree(app)
-    assert app.refusal("SceneCreateObject", kind, name, at(app, parent), options) == (m.ApplicationError, message)
+    assert app.result("SceneCreateObject", kind, name, at(app, parent), options) == (m.ApplicationError, message)
     assert tree(app) == before
 
 
@@ -111,7 +102,7 @@ def test_reparenting_keeps_or_resets_the_world_position(app, keep_world):
 
 def test_reparenting_under_a_descendant_is_refused(app):
     pelvis, head = at(app, "/Alice/Pelvis"), at(app, "/Alice/Pelvis/Thorax/Head")
-    assert app.refusal("ObjectSetParent", pelvis, head, True) == (
+    assert app.result("ObjectSetParent", pelvis, head, True) == (
         m.ApplicationError, f"object {pelvis} cannot be moved under itself or its descendants")
     assert app.ObjectGetPath(pelvis) == "/Alice/Pelvis"
 
@@ -139,7 +130,7 @@ def test_select_by_type_all_and_invert(app):
     app.SceneSelectAllObjects(2)
     assert app.SceneGetSelectedObjects() == ([], [])
     assert app.SceneGetPrimarySelectedObject() == (0, "")
-    assert app.refusal("ObjectSelect", at(app, "/Alice"), 4) == (
+    assert app.result("ObjectSelect", at(app, "/Alice"), 4) == (
         m.ApplicationError, "selection mode 4 is not one of 0 replace, 1 add, 2 remove, 3 toggle")
 
 
@@ -147,7 +138,7 @@ def test_active_clip(app):
     clip = app.SceneCreateObject("Clip", "Run", at(app, "/"), "")[0]
     app.SceneSetActiveClip("Run")
     assert app.SceneGetActiveClip() == "Run"
-    assert app.refusal("SceneSetActiveClip", "Alice") == (m.ApplicationError, "no clip named 'Alice'")
+    assert app.result("SceneSetActiveClip", "Alice") == (m.ApplicationError, "no clip named 'Alice'")
     app.SceneRemoveObject(clip, "")
     assert app.SceneGetActiveClip() == ""
 
@@ -187,7 +178,7 @@ def test_attribute_text_reads_back_exactly(app, path, name, kind, given, expecte
 def test_refused_attribute_values_change_nothing(app, path, name, value, message):
     obj = at(app, path)
     before = [app.AttributeGetValue(obj, a) for a in app.ObjectGetAttributes(obj)]
-    assert app.refusal("ObjectSetAttributeValue", obj, name, value) == (m.ApplicationError, message.format(obj))
+    assert app.result("ObjectSetAttributeValue", obj, name, value) == (m.ApplicationError, message.format(obj))
     assert [app.AttributeGetValue(obj, a) for a in app.ObjectGetAttributes(obj)] == before
 
 
@@ -230,8 +221,8 @@ def test_gaps_of_the_demo_and_values_where_there_is_no_key(app):
     assert linear == pytest.approx(before + (after - before) * 6 / 13)
 
 
-def test_key_selection(start_host):
-    app = Client(start_host("--frames", "10"))
+@pytest.mark.parametrize("frames", [10])
+def test_key_selection(app):
     marker = at(app, "/Bob/C7")
     x = channel(app, marker, "X")
     app.ChannelDeleteKey(marker, x, 2)
@@ -246,8 +237,7 @@ def test_key_selection(start_host):
     assert app.TimelineGetSelectedRanges() == [1, 4]
     app.ChannelDeleteAllKeys(marker, x)
     assert app.ChannelGetGaps(marker, x, 0) == "1-10"
-    assert app.refusal("ChannelDeleteKey", marker, x, 3) == (m.ApplicationError, "channel 'X' has no key at frame 3")
-    app.close()
+    assert app.result("ChannelDeleteKey", marker, x, 3) == (m.ApplicationError, "channel 'X' has no key at frame 3")
 
 
 @pytest.mark.parametrize("operation, args, code, message", [
@@ -262,7 +252,7 @@ def test_refused_channel_operations_change_nothing(app, operation, args, code, m
     marker = at(app, "/Alice/RANK")
     x = channel(app, marker, "X")
     before = app.GetTrajectory("Alice", "RANK")
-    assert app.refusal(operation, marker, x, *args) == (code, message)
+    assert app.result(operation, marker, x, *args) == (code, message)
     assert app.GetTrajectory("Alice", "RANK") == before and app.ChannelGetDefaultValue(marker, x)[2] == "0"
 
 
@@ -282,7 +272,7 @@ def test_subject_parameters_are_the_parameters_of_the_tree(app):
     assert app.ObjectGetParameters(alice, 2) == [note] and app.ObjectHasParameter(alice, 1, note) == 0
     assert app.GetSubjectParamNames("Alice", "") == ["Height", "Mass", "LeftLegLength", "RightLegLength"]
     app.ParameterRemove(alice, height, "")
-    assert app.refusal("GetSubjectParamDetails", "Alice", "", "Height") == (
+    assert app.result("GetSubjectParamDetails", "Alice", "", "Height") == (
         m.ApplicationError, "subject 'Alice' has no parameter named 'Height'")
 
 
@@ -301,5 +291,5 @@ def test_refused_parameter_operations_change_nothing(app, operation, args, messa
     mass = app.ObjectGetParameter(bob, 0, "Mass")
     args = [int(a.format(mass=mass)) if a == "{mass}" else a for a in args]
     before = app.GetSubjectParamDetails("Bob", "", "Mass"), app.ObjectGetParameters(bob, 0)
-    assert app.refusal(operation, bob, *args) == (m.ApplicationError, message.format(obj=bob, mass=mass))
+    assert app.result(operation, bob, *args) == (m.ApplicationError, message.format(obj=bob, mass=mass))
     assert (app.GetSubjectParamDetails("Bob", "", "Mass"), app.ObjectGetParameters(bob, 0)) == before

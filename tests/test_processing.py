@@ -11,7 +11,6 @@ import pytest
 from scipy import interpolate
 
 import _Client3 as m
-from appclient import Client
 
 RIGID = 1e-6  # mm: the demo's markers on one segment move together, so a neighbour's fill is exact
 # mm: the reference page's bounds on cubic fills of gaps up to 0.2 s, found by filling every such gap
@@ -19,13 +18,6 @@ RIGID = 1e-6  # mm: the demo's markers on one segment move together, so a neighb
 # mm, Alice's LANK from frame 908), and across one (at most 7.106 mm, Alice's LANK from frame 502).
 CUBIC = 1.4
 CUBIC_ACROSS_A_TURN = 7.2
-
-
-@pytest.fixture
-def app(start_host):
-    client = Client(start_host("--frames", "1000"))
-    yield client
-    client.close()
 
 
 def trajectory(app, subject, marker):
@@ -75,12 +67,10 @@ def test_a_cut_gap_is_filled_close_to_the_motion_it_was_cut_from(app, marker, fi
     assert distance(filled, truth)[first:first + length].max() < tolerance
 
 
-def test_the_demo_gap_of_bob_lank_is_filled_within_the_cubic_bound(app, start_host):
+def test_the_demo_gap_of_bob_lank_is_filled_within_the_cubic_bound(app, start_host, clients):
     # A longer take has the same motion frame by frame, and its gaps elsewhere: it sees what the
     # 1,000-frame take's 0.2 s gap hides.
-    whole = Client(start_host("--frames", "2000"))
-    truth, seen = trajectory(whole, "Bob", "LANK")
-    whole.close()
+    truth, seen = trajectory(clients(start_host("--frames", "2000")), "Bob", "LANK")
     gap = ~trajectory(app, "Bob", "LANK")[1]
     assert gap.sum() == 20 and seen[:1000][gap].all()
     app.OfflineFixOcclusion("Bob", "")
@@ -161,10 +151,9 @@ def test_without_apply_fixed_markers_the_values_are_written_and_the_frames_stay_
 def test_a_refused_fix_changes_nothing(app, tmp_path, subject, options, setting, message):
     if setting:
         set_occlusion(app, *setting)
-    app.SaveFile(str(tmp_path / "before.scene"), "")
-    assert message in app.refusal("OfflineFixOcclusion", subject, options)[1]
-    app.SaveFile(str(tmp_path / "after.scene"), "")
-    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+    before = app.scene_file(tmp_path / "scene")
+    assert message in app.result("OfflineFixOcclusion", subject, options)[1]
+    assert app.scene_file(tmp_path / "scene") == before
 
 
 # ---- The pipeline: the order of the stages, their preconditions and their recorded results ----
@@ -191,31 +180,6 @@ def state(app):
 
 def seen_frames(app, subject):
     return np.array([trajectory(app, subject, marker)[1] for marker in app.GetMarkerNames(subject)])
-
-
-def test_the_stages_record_their_documented_results_in_order(app):
-    seen = sum(int(seen_frames(app, s).sum()) for s in ("Alice", "Bob"))
-    alice = int(seen_frames(app, "Alice").sum())
-    expected = {
-        "OfflineCalibrateCameras": "cameras=4;Enabled=true,",
-        "OfflineReconstruct": f"trajectories=24,seen={seen};EnvironmentalDriftTolerance=1.5,",
-        "OfflineLabelROM Alice": "markers=12,frames=867;StandardDeviation=2,",
-        "OfflineCalibrateLabelingSubjects Alice": "constraints=12,frames=200;RestImportance=1,",
-        "OfflineAutoLabel Alice": f"labelled={alice},moved=0,dropped=0;UseLabelingClusters=true,",
-        "OfflineFixOcclusion Alice": "filled=3,rigid=1,left=1;Enabled=true,",
-        "OfflineCreateSolvingSetupFromLS Alice": "bones=13,constraints=12",
-        "OfflineCalibrateSolvingSubjects Alice": "bones=13,calibrated=4;PriorImportance=1,",
-        "OfflineSolve Alice": "bones=13,frames=920;PriorImportance=1,",
-        "OfflineRetarget Alice": "bones=13,scale=1.0416666666666667",
-    }
-    for number, (operation, args) in enumerate(CHAIN):
-        getattr(app, operation)(*args)
-        recorded = state(app)
-        assert len(recorded) == number + 1
-        key = "Pipeline " + operation + (" Alice" if args[0] == "Alice" else "")
-        assert recorded[key].startswith(expected[key[len("Pipeline "):]])
-    assert seen_frames(app, "Alice").all(axis=0).sum() == 920
-
 
 
 # ---- What each stage says it did: the success record's text, its numbers counted from the scene ----
@@ -259,11 +223,11 @@ def fix_summary(app, subject, longest=50):
 def test_occlusion_fixing_says_for_each_subject_what_it_filled_and_left(app):
     cut(app, "Bob", "RKNE", 0, 3)  # a gap at the take's start stays
     expected = "; ".join(fix_summary(app, subject) for subject in ("Alice", "Bob"))
-    assert app.refusal("OfflineFixOcclusion", "", "") == (m.Success, expected)
-    assert app.refusal("PSL", "OfflineFixOcclusion Subject=Alice") == (m.Success, fix_summary(app, "Alice"))  # by name too
+    assert app.result("OfflineFixOcclusion", "", "") == (m.Success, expected)
+    assert app.result("PSL", "OfflineFixOcclusion Subject=Alice") == (m.Success, fix_summary(app, "Alice"))  # by name too
     set_occlusion(app, "ApplyFixedMarkers", False)
     cut(app, "Alice", "C7", 100, 10)
-    assert app.refusal("OfflineFixOcclusion", "Alice", "") == (
+    assert app.result("OfflineFixOcclusion", "Alice", "") == (
         m.Success, fix_summary(app, "Alice") + "; the filled frames stay unseen (ApplyFixedMarkers is off)")
 
 
@@ -281,9 +245,25 @@ def translations(app, subject):
     return [app.ObjectGetAttributeValue(bone, "Translation")[2] for bone in bones]
 
 
-def test_each_stage_says_what_it_did(app):
+# What each stage records in the take's pipeline state, by stage: its results, then its settings.
+RECORDED = {
+    "OfflineCalibrateCameras": "cameras=4;Enabled=true,",
+    "OfflineReconstruct": "trajectories=24,seen={everyone};EnvironmentalDriftTolerance=1.5,",
+    "OfflineLabelROM": "markers=12,frames=867;StandardDeviation=2,",
+    "OfflineCalibrateLabelingSubjects": "constraints=12,frames=200;RestImportance=1,",
+    "OfflineAutoLabel": "labelled={alice},moved=0,dropped=0;UseLabelingClusters=true,",
+    "OfflineFixOcclusion": "filled=3,rigid=1,left=1;Enabled=true,",
+    "OfflineCreateSolvingSetupFromLS": "bones=13,constraints=12",
+    "OfflineCalibrateSolvingSubjects": "bones=13,calibrated=4;PriorImportance=1,",
+    "OfflineSolve": "bones=13,frames=920;PriorImportance=1,",
+    "OfflineRetarget": "bones=13,scale=1.0416666666666667",
+}
+
+
+def test_each_stage_says_and_records_what_it_did(app):
     cameras = len(app.SceneGetObjectList("Camera")[0])
     everyone = sum(int(seen_frames(app, s).sum()) for s in ("Alice", "Bob"))
+    alice = int(seen_frames(app, "Alice").sum())
     active = m.Output_LabelingSubjectCalibrationSettings_ActiveFrames_get(
         app.record("OfflineGetLabelingSubjectCalibrationSettings"))
     height = app.GetSubjectParamDetails("Alice", "", "Height")[0]
@@ -306,28 +286,19 @@ def test_each_stage_says_what_it_did(app):
         "OfflineRetarget": lambda: (f"Alice: {bones} bones retargeted into RX, RY and RZ, their offsets from the root scaled by "
                                     f"{1750 / height!r} to the 1750 mm figure"),
     }
-    for operation, args in CHAIN:
+    for number, (operation, args) in enumerate(CHAIN, start=1):
         before = expected[operation]() if expected[operation] else translations(app, "Alice")
-        code, text = app.refusal(operation, *args)
+        code, text = app.result(operation, *args)
         if not expected[operation]:
             changed = sum(a != b for a, b in zip(before, translations(app, "Alice")))
             before = f"Alice: translations of {changed} of {bones} bones set"
         assert (code, text) == (m.Success, before), operation
+        recorded = state(app)
+        assert len(recorded) == number
+        key = "Pipeline " + operation + (" Alice" if args[0] == "Alice" else "")
+        assert recorded[key].startswith(RECORDED[operation].format(everyone=everyone, alice=alice)), operation
+    assert seen_frames(app, "Alice").all(axis=0).sum() == 920
 
-
-def test_quick_post_says_what_each_of_its_stages_did(app):
-    run_chain(app, 8)
-    code, text = app.refusal("OfflineQuickPost", "Alice", "")
-    assert code == m.Success
-    assert re.fullmatch(r"OfflineAutoLabel Alice: \d+ labels given, .*; 0 points dropped; "
-                        r"OfflineFixOcclusion Alice: \d+ gaps? filled \(.*\), \d+ left \(.*\); "
-                        r"OfflineSolve Alice: 13 bones solved into TX, TY and TZ, every one of them placed at 920 of 1000 frames",
-                        text), text
-
-
-def test_other_commands_answer_success_with_the_codes_text(app):
-    assert app.refusal("GetSubjectNames") == (m.Success, "OK")
-    assert app.refusal("OfflineSetOcclusionFixingSettings", app.record("OfflineGetOcclusionFixingSettings")) == (m.Success, "OK")
 
 NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the refusal)
     (0, "OfflineReconstruct", ("",), "'OfflineReconstruct' needs 'OfflineCalibrateCameras' to run first"),
@@ -348,30 +319,34 @@ NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the ref
 def test_a_stage_whose_need_has_not_run_is_refused_and_changes_nothing(app, tmp_path, ran, operation, args, message):
     for earlier, earlier_args in CHAIN[:ran]:
         getattr(app, earlier)(*earlier_args)
-    app.SaveFile(str(tmp_path / "before.scene"), "")
-    assert message in app.refusal(operation, *args)[1]
-    app.SaveFile(str(tmp_path / "after.scene"), "")
-    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+    before = app.scene_file(tmp_path / "scene")
+    assert message in app.result(operation, *args)[1]
+    assert app.scene_file(tmp_path / "scene") == before
 
 
 def test_camera_calibration_needs_two_cameras(app):
     app.NewScene()
-    assert "needs at least two cameras in the scene, and there are 0" in app.refusal("OfflineCalibrateCameras", "")[1]
+    assert "needs at least two cameras in the scene, and there are 0" in app.result("OfflineCalibrateCameras", "")[1]
 
 
-def test_quick_post_runs_its_stages_in_order_and_stops_at_the_first_that_cannot_run(app):
-    assert app.refusal("OfflineQuickPost", "Alice", "")[1] == (
+def test_quick_post_runs_its_stages_in_order_until_one_cannot_run(app):
+    assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineAutoLabel': 'OfflineAutoLabel' needs 'OfflineReconstruct' to run first")
     assert state(app) == {}
     for operation, args in CHAIN[:4]:
         getattr(app, operation)(*args)
-    assert app.refusal("OfflineQuickPost", "Alice", "")[1] == (
+    assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineSolve': 'OfflineSolve' needs 'OfflineCalibrateSolvingSubjects' to run first for subject 'Alice'")
     assert {"Pipeline OfflineAutoLabel Alice", "Pipeline OfflineFixOcclusion Alice"} <= set(state(app))
     assert "Pipeline OfflineSolve Alice" not in state(app)
     for operation, args in CHAIN[6:8]:
         getattr(app, operation)(*args)
-    app.OfflineQuickPost("Alice", "")
+    code, text = app.result("OfflineQuickPost", "Alice", "")
+    assert code == m.Success
+    assert re.fullmatch(r"OfflineAutoLabel Alice: \d+ labels given, .*; 0 points dropped; "
+                        r"OfflineFixOcclusion Alice: \d+ gaps? filled \(.*\), \d+ left \(.*\); "
+                        r"OfflineSolve Alice: 13 bones solved into TX, TY and TZ, every one of them placed at 920 of 1000 frames",
+                        text), text
     assert state(app)["Pipeline OfflineSolve Alice"].startswith("bones=13,frames=920;")
 
 
@@ -457,11 +432,10 @@ def test_labelling_refuses_templates_closer_than_the_separation_distance(app, tm
     settings = app.record("OfflineGetLabelROMSettings")
     m.Output_LabelROMSettings_SeparationDistance_set(settings, 200)
     app.OfflineSetLabelROMSettings(settings)
-    app.SaveFile(str(tmp_path / "before.scene"), "")
-    message = app.refusal("OfflineLabelROM", "Alice", "")[1]
+    before = app.scene_file(tmp_path / "scene")
+    message = app.result("OfflineLabelROM", "Alice", "")[1]
     assert "of subject 'Alice' lie closer together than the LabelROM setting 'SeparationDistance' (200 mm)" in message
-    app.SaveFile(str(tmp_path / "after.scene"), "")
-    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+    assert app.scene_file(tmp_path / "scene") == before
 
 
 @pytest.mark.parametrize("constraint, markers", [
@@ -498,7 +472,6 @@ def test_solving_places_each_bone_where_its_markers_put_it(app):
     assert np.abs(pelvis - centre).max() < 1e-3
 
 
-
 def test_a_bone_with_one_marker_unseen_is_still_at_the_centre_of_its_markers(app):
     run_chain(app, 9)
     heads = [trajectory(app, "Alice", marker)[0][:, 504] for marker in ("LFHD", "RFHD")]
@@ -507,6 +480,7 @@ def test_a_bone_with_one_marker_unseen_is_still_at_the_centre_of_its_markers(app
     head, keyed = bone_path(app, "Alice", "Pelvis/Thorax/Head", "T", [505])
     assert keyed.all()
     assert np.abs(head[:, 0] - np.mean(heads, axis=0)).max() < 1e-3
+
 
 def test_a_bone_without_markers_follows_its_parent_and_one_whose_markers_are_unseen_has_no_key(app):
     run_chain(app, 9)
@@ -537,11 +511,9 @@ def test_retargeting_scales_each_bone_offset_from_the_root_to_the_standard_heigh
 
 def test_solved_bone_channels_are_kept_in_the_scene_file(app, tmp_path):
     run_chain(app, 10)
-    app.SaveFile(str(tmp_path / "solved.scene"), "")
+    solved = app.scene_file(tmp_path / "solved.scene")
     app.LoadFile(str(tmp_path / "solved.scene"))
-    app.SaveFile(str(tmp_path / "again.scene"), "")
-    assert (tmp_path / "again.scene").read_bytes() == (tmp_path / "solved.scene").read_bytes()
-
+    assert app.scene_file(tmp_path / "again.scene") == solved
 
 
 def hide_marker(app, subject="Alice"):
@@ -569,10 +541,10 @@ def zero_height(app):
 def test_a_stage_that_cannot_compute_its_result_is_refused_and_changes_nothing(app, tmp_path, ran, spoil, operation, args, message):
     run_chain(app, ran)
     spoil(app)
-    app.SaveFile(str(tmp_path / "before.scene"), "")
-    assert app.refusal(operation, *args)[1] == message
-    app.SaveFile(str(tmp_path / "after.scene"), "")
-    assert (tmp_path / "after.scene").read_bytes() == (tmp_path / "before.scene").read_bytes()
+    before = app.scene_file(tmp_path / "scene")
+    assert app.result(operation, *args)[1] == message
+    assert app.scene_file(tmp_path / "scene") == before
+
 
 # ---- Long stages: progress in the log, and other clients served meanwhile ----
 
@@ -580,7 +552,7 @@ STAGE_IN_CHILD = """
 import sys
 sys.path[:0] = [sys.argv[1]]
 import companion
-from appclient import Client
+from hostproc import Client
 companion.register()
 
 class Host:
@@ -590,9 +562,9 @@ Client(Host).OfflineFixOcclusion("", "")
 """
 
 
-def test_reads_are_answered_and_writes_wait_while_another_client_runs_a_long_stage(start_host):
+def test_reads_are_answered_and_writes_wait_while_another_client_runs_a_long_stage(start_host, clients):
     host = start_host("--frames", "20000", "--fault", "stage-delay=40")
-    reader = Client(host)
+    reader = clients(host)
     stage = subprocess.Popen([sys.executable, "-c", STAGE_IN_CHILD, os.path.dirname(__file__), str(host.port)])
     try:
         answered = 0
@@ -612,7 +584,6 @@ def test_reads_are_answered_and_writes_wait_while_another_client_runs_a_long_sta
     finally:
         stage.kill()
         stage.wait()
-        reader.close()
     log = host.log()
     assert "OfflineFixOcclusion subject 'Bob': 100% done" in log
     assert log.index("OfflineFixOcclusion subject 'Alice': 50% done") < log.index("Pipeline OfflineFixOcclusion Alice")

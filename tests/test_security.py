@@ -3,7 +3,6 @@ with one, the directories file commands may use, its limits on frame size and re
 in which clients cannot forge lines."""
 import os
 import socket
-import struct
 import subprocess
 import time
 import types
@@ -13,7 +12,7 @@ import pytest
 
 import companion
 import hostproc
-from appclient import Client
+from hostproc import Client, address, frame, hello, request, text_value
 
 TOKEN = "correct horse"
 NEEDS_TOKEN = "the application needs its access token, and the client did not give it"
@@ -21,24 +20,13 @@ WRONG_TOKEN = "the access token the client gave is not the application's"
 APPLICATION_ERROR = "Host application encountered an error processing the request."
 
 
-def with_options(host, options):
-    """The host as appclient.Client connects to it, with options after its address."""
-    return types.SimpleNamespace(address=host.address + ("?" + options if options else ""), port=host.port)
-
-
 def connect(host, options=""):
     """The result code and message of a new client's Connect, whether it is then connected, and the
     frame count it reads."""
-    client = companion.classes["ZarvoPelluxPostClient"]()
-    record = m.ZarvoPelluxPostClient_Connect(client, with_options(host, options).address, host.port)
-    seen = (m.Output_Result_Result_get(record), m.SafeString_Value(m.Output_Result_ResultString_get(record)),
-            m.ZarvoPelluxPostClient_IsConnected(client), m.ZarvoPelluxPostClient_GetFrameCount(client))
-    m.delete_ZarvoPelluxPostClient(client)
+    client = Client()
+    seen = (*client.result("Connect", address(host, options), host.port), client.IsConnected(), client.GetFrameCount())
+    client.close()
     return seen
-
-
-def frame(payload):
-    return struct.pack("<I", len(payload)) + payload
 
 
 def receive_all(sock):
@@ -91,19 +79,13 @@ def test_host_without_a_token_takes_any(host, monkeypatch):
     assert connect(host, "token=whatever") == (m.Success, "OK", True, 1000)
 
 
-def test_no_command_runs_before_the_token_is_checked(start_host):
+def test_no_command_runs_before_the_token_is_checked(start_host, clients):
     host = start_host("--token", TOKEN)
-    app = Client(with_options(host, "token=" + TOKEN))
-    commands = app.GetCommandList()
-    name = b"Taken over"
-    hello = b"HZPP1" + struct.pack("<HHI", 1, len(commands), 5) + b"wrong"
-    rename = b"Q" + struct.pack("<IH", 1, commands.index("SetSceneName")) + b"\x01" + struct.pack("<I", len(name)) + name
     with socket.create_connection((host.address, host.port), timeout=5) as sock:
         # The hello and a request in one write: the request must never run.
-        sock.sendall(frame(hello) + frame(rename))
-        assert receive_all(sock) == frame(b"E" + struct.pack("<I", len(WRONG_TOKEN)) + WRONG_TOKEN.encode())
-    assert app.GetSceneName()[0] == "Demo"
-    app.close()
+        sock.sendall(hello(token=b"wrong") + request(1, "SetSceneName", text_value("Taken over")))
+        assert receive_all(sock) == frame(b"E" + text_value(WRONG_TOKEN)[1:])
+    assert clients(host, "token=" + TOKEN).GetSceneName()[0] == "Demo"
 
 
 # ---- Addresses to listen on ---------------------------------------------------------------------------------
@@ -117,7 +99,7 @@ def run_host(*options, token=None):
         env["CLIENT3_TOKEN"] = token
     process = subprocess.Popen([hostproc.executable(), "--port", "0", *options], env=env, stdin=subprocess.DEVNULL,
                                stdout=subprocess.PIPE, stderr=subprocess.PIPE)
-    return process, hostproc._first_line(process.stdout, time.monotonic() + 10)
+    return process, hostproc.first_line(process.stdout, time.monotonic() + 10)
 
 
 def stopped(process):
@@ -211,27 +193,25 @@ def filled(args, allowed, outside):
 
 @pytest.mark.skipif(not hasattr(os, "symlink"), reason="no symbolic links")
 @pytest.mark.parametrize("operation, args", ALLOWED, ids=[f"{o} {' '.join(map(str, a))}" for o, a in ALLOWED])
-def test_file_commands_inside_the_named_directories(start_host, places, operation, args):
+def test_file_commands_inside_the_named_directories(start_host, clients, places, operation, args):
     allowed, outside = places
-    app = Client(start_host("--files", str(allowed), "--frames", "20"))
+    app = clients(start_host("--files", str(allowed), "--frames", "20"))
     before = outside_contents(outside)
     getattr(app, operation)(*filled(args, allowed, outside))
     assert outside_contents(outside) == before
-    app.close()
 
 
 @pytest.mark.skipif(not hasattr(os, "symlink"), reason="no symbolic links")
 @pytest.mark.parametrize("operation, args", REFUSED, ids=[f"{o} {' '.join(map(str, a))}" for o, a in REFUSED])
-def test_file_commands_outside_the_named_directories_are_refused(start_host, places, operation, args):
+def test_file_commands_outside_the_named_directories_are_refused(start_host, clients, places, operation, args):
     allowed, outside = places
-    app = Client(start_host("--files", str(allowed), "--frames", "20"))
+    app = clients(start_host("--files", str(allowed), "--frames", "20"))
     before = outside_contents(outside), app.GetSceneName()
     args = filled(args, allowed, outside)
     path = args[1] if operation == "DatabaseSetCurrent" else args[0]
-    assert app.refusal(operation, *args) == (m.ApplicationError, f"'{path}' is not inside the directories the application may use")
+    assert app.result(operation, *args) == (m.ApplicationError, f"'{path}' is not inside the directories the application may use")
     assert (outside_contents(outside), app.GetSceneName()) == before
     assert app.DatabaseGetCurrent("Database") == ""
-    app.close()
 
 
 def test_files_option_names_an_existing_directory(tmp_path):
@@ -245,31 +225,27 @@ def test_files_option_names_an_existing_directory(tmp_path):
 # ---- Limits ---------------------------------------------------------------------------------------------
 
 
-def test_a_request_over_the_frame_limit_is_refused(start_host):
+def test_a_request_over_the_frame_limit_is_refused(start_host, clients):
     host = start_host("--max-frame", "4096")
-    app = Client(host)
+    app = clients(host)
     app.SetTrajectoryAtFrame("Alice", "LANK", 5, 1.0, 2.0, 3.0, True)
     xyz = companion.classes["vectord"]([1.0] * 1000)
     seen = companion.classes["vectorb"]([True] * 1000)
-    assert app.refusal("SetTrajectory", "Alice", "LANK", xyz, xyz, xyz, seen) == (
+    assert app.result("SetTrajectory", "Alice", "LANK", xyz, xyz, xyz, seen) == (
         m.ApplicationError, "a frame may hold at most 4096 bytes")
     assert app.IsConnected() is False
-    again = Client(host)
-    assert again.GetTrajectoryAtFrame("Alice", "LANK", 5) == (1.0, 2.0, 3.0, True)
-    again.close()
+    assert clients(host).GetTrajectoryAtFrame("Alice", "LANK", 5) == (1.0, 2.0, 3.0, True)
 
 
-def test_a_fast_client_is_slowed_and_loses_nothing(start_host):
-    app = Client(start_host("--rate", "20"))
-    app.GetTrajectoryAtFrame("Alice", "LANK", 1)  # the command descriptions the test client reads once
+def test_a_fast_client_is_slowed_and_loses_nothing(start_host, clients):
+    app = clients(start_host("--rate", "100"))
     started = time.monotonic()
-    for f in range(1, 61):
+    for f in range(1, 151):
         app.SetTrajectoryAtFrame("Alice", "LANK", f, float(f), -float(f), 0.5, True)
-    # 60 requests at 20 a second after a burst of at most 20: two seconds at the least.
-    assert time.monotonic() - started >= 2.0
+    # 150 requests at 100 a second after a burst of at most 100: half a second at the least.
+    assert time.monotonic() - started >= 0.5
     x, y, z, e = app.GetTrajectory("Alice", "LANK")
-    assert (x[:60], y[:60]) == ([float(f) for f in range(1, 61)], [-float(f) for f in range(1, 61)])
-    app.close()
+    assert (x[:150], y[:150]) == ([float(f) for f in range(1, 151)], [-float(f) for f in range(1, 151)])
 
 
 # ---- The log ---------------------------------------------------------------------------------------------
@@ -281,15 +257,7 @@ def test_a_fast_client_is_slowed_and_loses_nothing(start_host):
     ("escape \x1b[2J and bell \x07", "escape ?[2J and bell ?"),
     ("tab\tand delete\x7f", "tab?and delete?"),
 ])
-def test_client_text_cannot_forge_log_lines(client_app, sent, logged):
-    app, host = client_app
-    app.Log("info", sent)
-    assert host.log().splitlines()[-1].split(" info ", 1)[1] == logged
-
-
-@pytest.fixture
-def client_app(start_host):
+def test_client_text_cannot_forge_log_lines(start_host, clients, sent, logged):
     host = start_host()
-    app = Client(host)
-    yield app, host
-    app.close()
+    clients(host).Log("info", sent)
+    assert host.log().splitlines()[-1].split(" info ", 1)[1] == logged

@@ -3,8 +3,6 @@ applied whole or not at all, getters that hand out copies, and the settings kept
 import _Client3 as m
 import pytest
 
-from appclient import Client
-
 # Every field of every record in declared order: (name, default) for a flag, (name, default, least,
 # most) for a number, (name, default, [allowed words]) for a text.
 FIELDS = {
@@ -47,10 +45,8 @@ WORDS = [(record, f[0], f[2]) for record, fields in FIELDS.items() for f in fiel
 
 
 @pytest.fixture
-def app(start_host):
-    client = Client(start_host("--frames", "50"))
-    yield client
-    client.close()
+def frames():
+    return 50
 
 
 def get(app, record):
@@ -83,7 +79,7 @@ def test_a_number_outside_its_range_is_refused_naming_the_field_and_range(app, r
     before = values(app, record)
     settings = get(app, record)
     put(settings, record, field, (least - 1) if side == "below" else (most + 1))
-    code, text = app.refusal(f"OfflineSet{record}Settings", settings)
+    code, text = app.result(f"OfflineSet{record}Settings", settings)
     assert code != m.Success
     assert f"'{field}' must be {ranged(least, most)}" in text
     assert values(app, record) == before
@@ -110,7 +106,7 @@ def test_a_text_field_takes_only_its_words(app, record, field, words):
         assert values(app, record)[index] == word
     settings = get(app, record)
     put(settings, record, field, words[0].lower() + "!")
-    code, text = app.refusal(f"OfflineSet{record}Settings", settings)
+    code, text = app.result(f"OfflineSet{record}Settings", settings)
     assert f"'{field}' must be one of {','.join(words)}" in text
     assert values(app, record)[index] == words[-1]
 
@@ -119,7 +115,7 @@ def test_a_record_is_applied_whole_or_not_at_all(app):
     settings = get(app, "Reconstruct")
     put(settings, "Reconstruct", "EnvironmentalDriftTolerance", 2.5)  # valid
     put(settings, "Reconstruct", "NumThreads", 65)  # invalid, declared after it
-    assert app.refusal("OfflineSetReconstructSettings", settings)[0] != m.Success
+    assert app.result("OfflineSetReconstructSettings", settings)[0] != m.Success
     assert values(app, "Reconstruct")[0] == 1.5
     put(settings, "Reconstruct", "NumThreads", 4)
     app.OfflineSetReconstructSettings(settings)
@@ -135,7 +131,7 @@ def test_a_lower_bound_may_not_exceed_its_upper_bound(app, low, high):
     settings = get(app, "Reconstruct")
     put(settings, "Reconstruct", low, 12)
     put(settings, "Reconstruct", high, 11)
-    code, text = app.refusal("OfflineSetReconstructSettings", settings)
+    code, text = app.result("OfflineSetReconstructSettings", settings)
     assert f"'{low}' (12) cannot exceed '{high}' (11)" in text
     assert values(app, "Reconstruct") == before
 
@@ -207,6 +203,6 @@ def test_a_scene_file_with_a_bad_setting_is_refused(app, tmp_path, line, message
     settings = get(app, "Solving")
     put(settings, "Solving", "MeanPoseRatio", 3)
     app.OfflineSetSolvingSettings(settings)
-    code, text = app.refusal("LoadFile", str(tmp_path / "bad.scene"))
+    code, text = app.result("LoadFile", str(tmp_path / "bad.scene"))
     assert text == f"the scene file is damaged at line {number}: {message}"
     assert values(app, "Solving")[1] == 3

@@ -6,8 +6,6 @@ import os
 import _Client3 as m
 import pytest
 
-from appclient import Client
-
 
 @pytest.fixture
 def host(start_host):
@@ -15,10 +13,8 @@ def host(start_host):
 
 
 @pytest.fixture
-def app(host):
-    client = Client(host)
-    yield client
-    client.close()
+def app(host, clients):
+    return clients(host)
 
 
 def script_lines(host):
@@ -54,9 +50,9 @@ def test_script_path_refusals(app, host, tmp_path):
         ("RemoveScriptPath", str(tmp_path)), f"'{tmp_path}' is not on the script path",
     ]
     for args, message in zip(cases[::2], cases[1::2]):
-        assert app.refusal(*args) == (m.ApplicationError, message)
+        assert app.result(*args) == (m.ApplicationError, message)
     gone.rmdir()
-    assert app.refusal("ReparseScriptPaths") == (m.ApplicationError, f"the script directory '{gone}' cannot be read any more")
+    assert app.result("ReparseScriptPaths") == (m.ApplicationError, f"the script directory '{gone}' cannot be read any more")
     app.RemoveScriptPath(str(gone))  # a directory that has gone can still be taken off the path
     app.ReparseScriptPaths()
 
@@ -114,7 +110,7 @@ def test_links_inside_a_database_are_neither_followed_nor_listed(app, tmp_path):
         ("Take", "Session 1/Linked take", "the take 'Linked take' is a link: a database may not lead outside itself"),
         ("Take", "Linked session/Take", "the session 'Linked session' is a link: a database may not lead outside itself"),
     ]:
-        assert app.refusal("DatabaseSetCurrent", item, path) == (m.ApplicationError, message)
+        assert app.result("DatabaseSetCurrent", item, path) == (m.ApplicationError, message)
     assert current(app) == (str(database), "Session 1", "")
 
 
@@ -123,8 +119,8 @@ def test_database_refusals_keep_what_is_current(app, tmp_path):
     work.mkdir()
     (work / "plain").mkdir()
     (work / "file").write_text("")
-    assert app.refusal("DatabaseGetMarkedTakes") == (m.ApplicationError, "there is no current database")
-    assert app.refusal("DatabaseSetCurrent", "Session", "Session 1") == (m.ApplicationError, "there is no current database")
+    assert app.result("DatabaseGetMarkedTakes") == (m.ApplicationError, "there is no current database")
+    assert app.result("DatabaseSetCurrent", "Session", "Session 1") == (m.ApplicationError, "there is no current database")
     app.DatabaseCreate(str(work), "db")
     (work / "db" / "Session 1" / "Take 1").mkdir()
     app.DatabaseSetCurrent("Take", "Take 1")
@@ -148,6 +144,6 @@ def test_database_refusals_keep_what_is_current(app, tmp_path):
         ("DatabaseGetCurrent", "Subject"), "'Subject' is not one of Database, Session, Take",
     ]
     for args, message in zip(cases[::2], cases[1::2]):
-        assert app.refusal(*args) == (m.ApplicationError, message)
+        assert app.result(*args) == (m.ApplicationError, message)
     assert current(app) == before
     assert sorted(os.listdir(work)) == ["db", "file", "plain"]
