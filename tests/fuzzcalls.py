@@ -85,6 +85,12 @@ class Hostile:
         return f"Hostile({self.error.__name__})"
 
 
+class Holder:
+    """An object whose "this" is not a proxy."""
+
+    this = 5
+
+
 class Sequence:
     """A sequence that can lie about its length, raise part way, or change a vector while read."""
 
@@ -253,7 +259,7 @@ class Batch:
             return slice(r.choice([None, 0, 1, -1, 2 ** 40, 1.5]), r.choice([None, 2, -1, 2 ** 63]),
                          r.choice([None, 1, -1, 2, 0, -(2 ** 63)]))
         if kind == 11:
-            return r.choice([object(), {}, {"this": 1}, type, 1j, Ellipsis])
+            return r.choice([object(), {}, {"this": 1}, Holder(), type, 1j, Ellipsis])
         return self.proxy()
 
     def typed(self, text, vector):

@@ -103,7 +103,7 @@ def shapes(classes, client, connected):
 VALUES = 1000
 
 
-def leaks(classes):
+def leaks():
     counter = iter(range(10 ** 9))
     yield "vector made by new_vectord", VALUES * 8, lambda: m.new_vectord([0.5] * VALUES)
     yield "new_SafeString of a new text", VALUES, lambda: m.new_SafeString("%0*d" % (VALUES, next(counter)))
@@ -152,7 +152,7 @@ def main():
                 rss, traced = growth(call, options.calls)
                 took = (time.perf_counter() - started) / (options.calls * 1.1) * 1e6
                 print(f"{family:10} {shape:36} {rss:16.4f} {traced:14.4f} {took:8.1f}", flush=True)
-            for shape, least, call in leaks(classes):
+            for shape, least, call in leaks():
                 calls = max(1, options.calls // 100)
                 rss, traced = growth(call, calls)
                 print(f"{'leak':10} {shape:36} {rss:16.1f} {traced:14.4f}   (at least {least} bytes per call, {calls} calls)", flush=True)

@@ -209,7 +209,6 @@ FILLED = [
     ("vectori", np.array([65535], dtype=np.uint16), [65535]),
     ("vectori", np.array([2**31 - 1], dtype=np.uint32), [2**31 - 1]),
     ("vectori", np.array([2**31 - 1], dtype=np.uint64), [2**31 - 1]),
-    ("vectori", array.array("l", [-5, 5]), [-5, 5]),
     ("vectori", np.array([1, 2], dtype=np.int32).tobytes(), [1, 2]),
     ("vectorull", np.array([2**64 - 1], dtype=np.uint64), [2**64 - 1]),
     ("vectorull", np.array([2**63 - 1, 0], dtype=np.int64), [2**63 - 1, 0]),
@@ -292,14 +291,6 @@ def test_a_trajectory_gives_its_four_fields_as_arrays(trajectory):
     assert (x.tolist(), y.tolist(), z.tolist(), e.tolist()) == ([1.0, 2.0, 3.0], [4.0, 5.0, 6.0], [7.0, 8.0, 9.0], [True, False, True])
     x[0] = 10.0
     assert trajectory.X[0] == 10.0
-
-
-def test_a_trajectory_from_the_application_as_arrays(host):
-    with Client3.connect("127.0.0.1", host.port) as client:
-        record = client.GetTrajectory("Alice", "LANK").check()
-        x, y, z, e = record.arrays()
-        assert x.tolist() == list(record.X) and z.tolist() == list(record.Z) and e.tolist() == list(record.E)
-        assert len(y) == len(record.Y) > 0
 
 
 def test_numpy_stays_optional():

@@ -19,13 +19,6 @@ TYPE_PARAMETER = "_p_ZarvoSDKClientCPP__Type_Parameter"
 OUTPUT_RESULT = "_p_ZarvoSDKClientCPP__Output_Result"
 VECTOR_DOUBLE = "_p_std__vectorT_double_std__allocatorT_double_t_t"
 NO_SHADOW, DISOWN, IMPLICIT, NO_NULL = 2, 1, 2, 4
-DERIVED_RECORDS = """ProcessRequest GetServerInfo GetCommandList GetCommandInfo GetSceneName GetSubjectNames
-    GetMarkerNames HasTrajectory GetTrajectory GetTrajectoryAtFrame GetBoneNames GetRootBone GetBoneDetails
-    GetConstraintNames GetConstraintDetails GetSubjectParamNames GetSubjectParamDetails GetObject GetObjectList
-    GetIntegerList GetString GetAttribute GetStringList GetInteger GetUnsignedLong GetUnsignedLongList GetFloat
-    GetTakeInfo GetJointDetails GetJointNames GetRootSegment GetSegmentDetails GetSegmentNames GetTrialName
-    CircleFitSettings ReconstructSettings LabelingSettings OcclusionFixingSettings SolvingSettings
-    LabelingSubjectCalibrationSettings LabelROMSettings""".split()
 
 
 def record(name):
@@ -35,34 +28,21 @@ def record(name):
 # ---- Descriptors and cast lists -----------------------------------------------------------------
 
 
-def test_descriptor_table_is_sorted(peer):  # (that every name is found is checked with the ring)
-    names = peer.names()
-    assert len(names) == len(set(names)) == 84 and names == sorted(names, key=str.encode)
-
-
 def test_cast_lists(peer):
-    """The three base types accept their derived types; every other descriptor accepts only itself."""
+    """Output_Result accepts every other output record, ZarvoClient and IStringFactory their one derived
+    type; every other descriptor accepts only itself."""
     expected = {name: {name} for name in peer.names()}
-    expected[OUTPUT_RESULT] |= {record(name) for name in DERIVED_RECORDS}
+    expected[OUTPUT_RESULT] |= {name for name in peer.names() if name.startswith(record(""))}
     for base, derived in (("ZarvoClient", "ZarvoPelluxPostClient"), ("IStringFactory", "VStringFactory")):
         expected["_p_ZarvoSDKClientCPP__" + base].add("_p_ZarvoSDKClientCPP__" + derived)
     casts = {name: peer.casts(name) for name in peer.names()}
-    assert all(len(c) == len(set(c)) for c in casts.values()) and {name: set(c) for name, c in casts.items()} == expected
-
-
-def test_conversion_through_a_cast_moves_the_entry_to_the_front(peer):
-    for name, address in (("GetTrajectory", 0x1230), ("GetFloat", 0x4560)):
-        assert peer.convert(peer.make(record(name), address, NO_SHADOW), OUTPUT_RESULT, 0) == (0, address, 0)
-        assert peer.casts(OUTPUT_RESULT)[0] == record(name)
-    casts = peer.casts(OUTPUT_RESULT)
-    assert casts[1] == record("GetTrajectory") and len(casts) == len(set(casts)) == 42
-    # An exact match does not touch the list.
-    assert peer.convert(peer.make(OUTPUT_RESULT, 0x7890, NO_SHADOW), OUTPUT_RESULT, 0) == (0, 0x7890, 0)
-    assert peer.casts(OUTPUT_RESULT) == casts
+    assert {name: set(found) for name, found in casts.items()} == expected
+    assert all(len(found) == len(set(found)) for found in casts.values())
 
 
 def test_records_of_many_kinds_pass_as_their_base_in_any_order(peer):
-    """Each conversion reorders the base's cast list; every answer stays right, and the list keeps every entry."""
+    """Each conversion through a cast moves its entry to the front of the base's list; every answer stays
+    right, and the list keeps every entry once."""
     kinds = ["GetTrajectory", "GetFloat", "ReconstructSettings", "ProcessRequest", "GetObjectList", "Result"]
     records = {kind: peer.record(OUTPUT_RESULT if kind == "Result" else record(kind)) for kind in kinds}
     for number, kind in enumerate(kinds):
@@ -71,9 +51,13 @@ def test_records_of_many_kinds_pass_as_their_base_in_any_order(peer):
     orders = [kinds, kinds[::-1], kinds[:2] * 5, [k for k in kinds for _ in range(3)], kinds[::2] + kinds[1::2],
               random.Random(7).choices(kinds, k=300)]
     unrelated = _Client3.new_Type_Parameter()
+    front = peer.casts(OUTPUT_RESULT)[0]
     for order in orders:
         for kind in order:
             assert _Client3.Output_Result_Result_get(records[kind]) == 100 + kinds.index(kind), kind
+            if kind != "Result":  # an exact match leaves the list alone
+                front = record(kind)
+            assert peer.casts(OUTPUT_RESULT)[0] == front
         raises(TypeError, "in method 'Output_Result_Result_get', argument 1 of type 'ZarvoSDKClientCPP::Output_Result *'",
                _Client3.Output_Result_Result_get, unrelated)
     assert sorted(peer.casts(OUTPUT_RESULT)) == casts
@@ -211,19 +195,6 @@ def test_type_query(peer, text, found):
     assert (text in peer.cache()) is bool(found)
 
 
-def test_type_query_cache_is_keyed_by_exact_text(peer):
-    capsule_new = ctypes.pythonapi.PyCapsule_New
-    capsule_new.restype, capsule_new.argtypes = ctypes.py_object, [ctypes.c_void_p, ctypes.c_char_p, ctypes.c_void_p]
-    cache, found = peer.cache(), "_p_std__vectorT_int_std__allocatorT_int_t_t"
-    # A cached answer is taken as it stands, without looking at the ring again.
-    cache["std::vector< int > *"] = capsule_new(peer.descriptor("_p_char")[1], None, None)
-    try:
-        assert (peer.query("std::vector< int > *"), peer.query("std::vector<int> *")) == ("_p_char", found)
-    finally:
-        del cache["std::vector< int > *"]
-    assert peer.query("std::vector< int > *") == found
-
-
 # ---- Bad input from other modules and scripts, in a fresh interpreter ------------------------------
 
 REFUSED = "in method 'SafeString_IsEmpty', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'\n"
@@ -315,7 +286,7 @@ assert all(len(set(peer.descriptor(name))) == 1 for name in peer.names())  # hea
 made = _Client3.new_SafeString()
 assert peer.proxy_type(made) == peer.descriptor({safe!r})[2]
 casts = peer.casts({result!r})
-assert len(casts) == len(set(casts)) == 42, casts
+assert sorted(casts) == [name for name in peer.names() if name.startswith("_p_ZarvoSDKClientCPP__Output_")], casts
 _Client3.SafeString_swigregister(type("S", (), {{"__swig_destroy__": _Client3.delete_SafeString}}))
 assert type(peer.make({safe!r}, int(made), 0)).__name__ == "S"
 made.disown()

@@ -1,5 +1,5 @@
-"""SafeString functions, ToString and text conversion both ways; argument unpacking, error codes and the texts a
-script sees when a call goes wrong."""
+"""SafeString functions, ToString and text conversion both ways, and the texts a script sees when a
+call goes wrong."""
 import ctypes
 
 import pytest
@@ -112,73 +112,10 @@ def test_to_string(code, message):
         raises(message, "in method 'ToString', argument 1 of type 'ZarvoSDKClientCPP::ResultCode::Enum'", _Client3.ToString, code)
 
 
-# ---- Argument unpacking and error reporting ------------------------------------------------------
+# ---- The texts a script sees when a call goes wrong ----------------------------------------------
 
 OVERLOADS = overload_text("new_SafeString", *(f"ZarvoSDKClientCPP::SafeString::SafeString({p})" for p in (
     "char const *", "", "std::string const &", "ZarvoSDKClientCPP::SafeString const &")))
-
-
-class Tuple(tuple):
-    pass
-
-
-# (argument object or None for no object, min, max) -> (result, items), or the TypeError text, or the exception
-@pytest.mark.parametrize("given, low, high, expected", [
-    (None, 0, 0, (1, ())), (None, 1, 1, "f expected 1 arguments, got none"),
-    (None, 1, 2, "f expected at least 1 arguments, got none"), (None, 0, 2, "f expected at least 0 arguments, got none"),
-    ((), 0, 0, (1, ())), ((), 1, 2, "f expected at least 1 arguments, got 0"), ((1,), 2, 2, "f expected 2 arguments, got 1"),
-    ((1, 2), 3, 3, "f expected 3 arguments, got 2"), ((1, 2, 3), 0, 2, "f expected at most 2 arguments, got 3"),
-    ((1, 2, 3), 2, 2, "f expected 2 arguments, got 3"), ((1,), 0, 3, (2, (1, None, None))), ((1, 2), 1, 2, (3, (1, 2))),
-    (Tuple((7, 8)), 2, 2, (3, (7, 8))),
-    # A bare object counts as one argument.
-    (5, 1, 1, (2, (5,))), (5, 0, 3, (2, (5, None, None))), ([1, 2], 1, 2, (2, ([1, 2], None))),
-    # ... but only where one argument is allowed.
-] + [(5, low, high, SystemError("UnpackTuple() argument list is not a tuple")) for low, high in ((2, 2), (0, 0), (2, 3))])
-def test_unpack(peer, given, low, high, expected):
-    if isinstance(expected, tuple):
-        assert peer.unpack(given, "f", low, high) == expected
-    else:
-        expected = TypeError(expected) if isinstance(expected, str) else expected
-        raises(type(expected), str(expected), peer.unpack, given, "f", low, high)
-
-
-def test_error_type(peer):
-    expected = [RuntimeError, OSError, RuntimeError, IndexError, TypeError, ZeroDivisionError, OverflowError,
-                SyntaxError, ValueError, SystemError, AttributeError, MemoryError, RuntimeError]
-    assert [peer.error_type(code) for code in range(-1, -14, -1)] == expected
-    assert [peer.error_type(code) for code in (-14, 0, 7)] == [RuntimeError] * 3  # unknown codes
-
-
-class Unprintable(Exception):
-    def __str__(self):
-        raise ValueError("no text")
-
-
-# (pending exception, message) -> (raised type, text); a class is raised without a value, and an old
-# value without text is replaced by the message.
-@pytest.mark.parametrize("pending, result", [
-    (None, (RuntimeError, "more")), (ValueError("old"), (ValueError, "old more")),
-    (KeyError("k"), (KeyError, "'k' more")), (IndexError, (IndexError, "more")), (Unprintable(), (Unprintable, "more")),
-    (ValueError(""), (ValueError, "more")),
-])
-def test_add_error_msg(peer, pending, result):
-    error = pytest.raises(Exception, peer.add_error_msg, pending, "more").value
-    assert (type(error), error.args) == (result[0], (result[1],))
-
-
-class TypeErrorKind(TypeError):
-    pass
-
-
-@pytest.mark.parametrize("pending, result", [
-    (None, (TypeError, "msg")), (TypeError("inner"), (TypeError, "inner\nAdditional information:\nmsg")),
-    (TypeErrorKind("sub"), (TypeErrorKind, "sub\nAdditional information:\nmsg")), (ValueError("other"), (TypeError, "msg")),
-])
-def test_raise_or_modify_type_error(peer, pending, result):
-    raises(*result, peer.raise_or_modify, pending, "msg")
-
-
-# ---- Through the module's own functions ---------------------------------------------------------
 
 
 # A text that cannot be encoded is taken by no overload either.

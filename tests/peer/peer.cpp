@@ -128,40 +128,6 @@ PyObject* Names(PyObject*, PyObject*) {
   return list;
 }
 
-// unpack(arguments or None, name, min, max) -> (count, items): UnpackTuple on the given argument
-// object (None passes no argument object at all); missing items come back as None.
-PyObject* Unpack(PyObject*, PyObject* args) {
-  PyObject* given;
-  const char* name;
-  Py_ssize_t min, max;
-  if (!PyArg_ParseTuple(args, "Osnn", &given, &name, &min, &max)) return nullptr;
-  if (max < 0 || max > 8) return PyErr_Format(PyExc_ValueError, "max out of range");
-  PyObject* items[8];
-  Py_ssize_t count = UnpackTuple(given == Py_None ? nullptr : given, name, min, max, items);
-  if (!count) return nullptr;
-  PyObject* list = PyTuple_New(max);
-  for (Py_ssize_t i = 0; list && i < max; ++i) PyTuple_SET_ITEM(list, i, NewRef(items[i] ? items[i] : Py_None));
-  return list ? Py_BuildValue("(nN)", count, list) : nullptr;
-}
-
-PyObject* ErrorTypeOf(PyObject*, PyObject* code) {
-  int value = PyLong_AsLong(code);
-  return PyErr_Occurred() ? nullptr : NewRef(ErrorType(value));
-}
-
-// add_error_msg(pending, message) and raise_or_modify(pending, message): make `pending` pending (an
-// instance, or a class raised without a value; None leaves nothing pending), then report; always raise.
-template <void (*Report)(const char*)>
-PyObject* Reporting(PyObject*, PyObject* args) {
-  PyObject* pending;
-  const char* message;
-  if (!PyArg_ParseTuple(args, "Os", &pending, &message)) return nullptr;
-  if (PyExceptionClass_Check(pending)) PyErr_SetNone(pending);
-  else if (pending != Py_None) PyErr_SetObject(reinterpret_cast<PyObject*>(Py_TYPE(pending)), pending);
-  Report(message);
-  return nullptr;
-}
-
 // What the library side receives from a `SafeString const &` argument: its bytes, or None when the
 // text is null or empty.
 constexpr auto Received = [](const SafeString& text) -> PyObject* {
@@ -204,9 +170,7 @@ using Functions = Table<
     Raw<"ring", NoArgs, Ring>, Raw<"own_module", NoArgs, OwnModule>, Raw<"casts", Object, Casts>,
     Raw<"descriptor", Object, Descriptor>, Raw<"proxy_type", Object, ProxyType>, Raw<"make", Tuple, Make>,
     Raw<"convert", Tuple, Convert>, Raw<"query", Object, Query>, Raw<"cache", NoArgs, Cache>,
-    Raw<"packed", Tuple, Packed>, Raw<"names", NoArgs, Names>, Raw<"unpack", Tuple, Unpack>,
-    Raw<"error_type", Object, ErrorTypeOf>, Raw<"add_error_msg", Tuple, Reporting<AddErrorMsg>>,
-    Raw<"raise_or_modify", Tuple, Reporting<RaiseOrModifyTypeError>>, Fn<"echo", Object, Received, String>,
+    Raw<"packed", Tuple, Packed>, Raw<"names", NoArgs, Names>, Fn<"echo", Object, Received, String>,
     Fn<"library_text", Object, LibraryText, String>, Raw<"record", Object, Record>,
     Fn<"push_parameter", Tuple, PushParameter, ParameterVector, String, String>>;
 
