@@ -62,6 +62,14 @@ def test_created_objects_get_ids_that_are_never_used_again(app):
     assert again > child
 
 
+CONSTRAINT_DEFAULTS = {"Active": "true", "Source": "", "Target": "", "Offset": "0,0,0", "ConstraintType": "Point"}
+
+
+def test_a_created_constraint_starts_from_its_defaults(app):
+    constraint = app.SceneCreateObject("Constraint", "Knee", at(app, "/Alice"), "")[0]
+    assert {name: attribute(app, constraint, name)[2] for name in CONSTRAINT_DEFAULTS} == CONSTRAINT_DEFAULTS
+
+
 @pytest.mark.parametrize("kind, name, parent, options, message", [
     ("Widget", "W", "/", "", "no object type named 'Widget' can be created"),
     ("Marker", "M", "/", "", "a Marker cannot be a child of a Scene ('/')"),
