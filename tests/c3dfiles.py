@@ -164,8 +164,8 @@ def _texts_parameter(group, name, texts):
 def build(points, labels, rate=100.0, units="mm", scale=-1.0, analog=None, analog_per_frame=1, offsets=None):
     """A C3D file: `points` frames x points x 4 (x, y, z, fourth word; int16 when scale > 0), labels
     (str, or bytes as they stand in the file) in parameters of 255 at most (LABELS, LABELS2, ...),
-    `analog` frames x samples x channels; `offsets` (with integer data) makes the analog samples
-    unsigned, with ANALOG:FORMAT UNSIGNED and those ANALOG:OFFSET."""
+    `analog` frames x samples x channels; `offsets` gives ANALOG:OFFSET: as 16-bit unsigned integers,
+    the samples unsigned too (ANALOG:FORMAT UNSIGNED), where each is one, else as floats."""
     frames, count = points.shape[:2]
     channels = 0 if analog is None else analog.shape[2]
     items = [struct.pack("<bb", 5, -1) + b"POINT" + struct.pack("<HB", 3, 0),
@@ -183,9 +183,12 @@ def build(points, labels, rate=100.0, units="mm", scale=-1.0, analog=None, analo
                   _parameter(2, "USED", 2, [], struct.pack("<H", channels)),
                   _parameter(2, "RATE", 4, [], struct.pack("<f", rate * analog_per_frame)),
                   _texts_parameter(2, "LABELS", [f"EMG{c + 1}" for c in range(channels)])]
-    if offsets is not None:
+    unsigned = offsets is not None and all(o == int(o) and 0 <= o <= 65535 for o in offsets)
+    if unsigned:
         items += [_parameter(2, "FORMAT", -1, [8], b"UNSIGNED"),
                   _parameter(2, "OFFSET", 2, [channels], struct.pack(f"<{channels}H", *offsets))]
+    elif offsets is not None:
+        items.append(_parameter(2, "OFFSET", 4, [channels], struct.pack(f"<{channels}f", *offsets)))
     section = b"".join(items) + b"\0\0"
     blocks = (4 + len(section) + 511) // 512
     section = (bytes([1, 0x50, blocks, 84]) + section).ljust(blocks * 512, b"\0")
@@ -194,6 +197,6 @@ def build(points, labels, rate=100.0, units="mm", scale=-1.0, analog=None, analo
     dtype = "<f4" if scale < 0 else "<i2"
     data = points.astype(dtype).reshape(frames, -1)
     if channels:
-        samples = analog.astype("<u2" if offsets is not None else dtype).reshape(frames, -1)
+        samples = analog.astype("<u2" if unsigned else dtype).reshape(frames, -1)
         data = np.concatenate([data, samples.view(data.dtype)], axis=1)
     return header + section + data.tobytes()

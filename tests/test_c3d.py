@@ -289,6 +289,16 @@ def test_unsigned_analog_samples_and_offsets_are_written_back(app, tmp_path):
     assert np.array_equal(independent(tmp_path / "out.c3d", strict=True).analog, expected)
 
 
+def test_offsets_that_no_16_bit_integer_holds_are_written_back_as_floats(app, tmp_path):
+    emg = np.arange(10 * 2, dtype=np.float32).reshape(10, 1, 2)
+    (tmp_path / "offsets.c3d").write_bytes(build(np.zeros((10, 1, 4)), ["A:B"], analog=emg, offsets=[-5.0, 40_000.0]))
+    import_take(app, tmp_path / "offsets.c3d")
+    app.ExportFile(str(tmp_path / "out.c3d"), "")
+    import_take(app, tmp_path / "out.c3d")
+    offsets = [app.ObjectGetAttributeValue(analog, "Offset")[2] for analog in app.SceneGetObjectList("Analog")[0]]
+    assert [float(offset) for offset in offsets] == [-5.0, 40_000.0]
+
+
 def test_labels_become_names_an_object_can_have(app, tmp_path):
     labels = [b"\xc9paule", "Épaule".encode(), b"a/b:c\x01d", b""]  # Latin-1, UTF-8, bad characters, none
     (tmp_path / "labels.c3d").write_bytes(build(walk(3, 4), labels))
