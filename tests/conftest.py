@@ -12,6 +12,10 @@ import companion  # noqa: E402
 import hostproc  # noqa: E402
 from peer import build  # noqa: E402
 
+# The package registers its own classes when it is first imported: imported here, before the suite's
+# stand-in classes are registered, it never replaces them in the middle of a run.
+hostproc.commands()
+
 
 def _c_standard_output():
     """The C library, where the system lets Python open it by the null name (not on Windows)."""

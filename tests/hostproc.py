@@ -3,6 +3,7 @@ the module (a client whose operations answer with their record's fields) or byte
 
 A host is started on the loopback address with --port 0; its port is read from the first line it
 prints ("listening on 127.0.0.1:PORT") and its log (standard error) goes to a file."""
+import functools
 import os
 import re
 import selectors
@@ -15,17 +16,23 @@ import sysconfig
 import time
 
 import _Client3 as m
-from Client3 import _catalogue
 
 import companion
 
 ADDRESS = "127.0.0.1"
 NAME = "client3-host"
-# Every command of the application in the order of their numbers on the wire, with its inputs and outputs.
-COMMANDS = {name: (inputs, outputs) for name, _, inputs, outputs in _catalogue.COMMANDS}
-NUMBERS = {name: number for number, name in enumerate(COMMANDS)}
 MAX_FRAME = 64 << 20  # the most a frame may hold, unless --max-frame says otherwise
 NOT_CONNECTED = "Unable to communicate with the host application."
+
+
+@functools.lru_cache(maxsize=None)
+def commands():
+    """Every command of the application in the order of their numbers on the wire, with its inputs and
+    outputs. (The Client3 package, whose catalogue this is, registers its own classes when it is first
+    imported: the tools that start hosts and use the suite's stand-in classes do not import it.)"""
+    from Client3 import _catalogue
+
+    return {name: (inputs, outputs) for name, _, inputs, outputs in _catalogue.COMMANDS}
 
 
 # ---- The process --------------------------------------------------------------------------------
@@ -233,7 +240,7 @@ class Client:
         code = m.Output_Result_Result_get(record)
         if code != m.Success:
             raise ApplicationError(code, m.SafeString_Value(m.Output_Result_ResultString_get(record)))
-        outputs = [(name, type_) for name, type_ in COMMANDS.get(operation, ((), ()))[1] if hasattr(m, f"{kind}_{name}_get")]
+        outputs = [(name, type_) for name, type_ in commands().get(operation, ((), ()))[1] if hasattr(m, f"{kind}_{name}_get")]
         values = [plain(getattr(m, f"{kind}_{name}_get")(record), type_) for name, type_ in outputs]
         return values[0] if len(values) == 1 else tuple(values) if values else None
 
@@ -256,7 +263,8 @@ def frame(payload):
     return struct.pack("<I", len(payload)) + payload
 
 
-def hello(version=1, count=len(COMMANDS), token=b""):
+def hello(version=1, count=None, token=b""):
+    count = len(commands()) if count is None else count
     return frame(b"HZPP1" + struct.pack("<HHI", version, count, len(token)) + token)
 
 
@@ -271,7 +279,7 @@ def int_value(number):
 
 def request(number, command, *inputs):
     """A request frame for `command`, by name or by number."""
-    command = NUMBERS.get(command, command)
+    command = list(commands()).index(command) if isinstance(command, str) else command
     return frame(b"Q" + struct.pack("<IH", number, command) + b"".join(inputs))
 
 
@@ -310,7 +318,7 @@ def raw_connection(host):
 
 def shake_hands(sock):
     sock.sendall(hello())
-    assert read_frame(sock) == b"H" + struct.pack("<HH", 1, len(COMMANDS))
+    assert read_frame(sock) == b"H" + struct.pack("<HH", 1, len(commands()))
 
 
 def close_with_reset(sock):

@@ -16,10 +16,11 @@ import pytest
 
 import _Client3 as m
 import repeat
-from hostproc import (COMMANDS, MAX_FRAME, NOT_CONNECTED, Client, connections_of, frame, hello, int_value, parameters,
+from hostproc import (MAX_FRAME, NOT_CONNECTED, Client, commands, connections_of, frame, hello, int_value, parameters,
                       plain, raw_connection, read_frame, refusal, reply, request, shake_hands, text_value, unread_bytes,
                       wait_until)
 
+COMMANDS = commands()
 FRAMES = 1000
 MARKERS = "LFHD RFHD C7 STRN LASI RASI LWRA RWRA LKNE RKNE LANK RANK".split()
 MARKER_BONES = "Head Head Thorax Thorax Pelvis Pelvis LeftHand RightHand LeftShin RightShin LeftFoot RightFoot".split()

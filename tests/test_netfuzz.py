@@ -21,7 +21,7 @@ import pytest
 import companion
 import hostproc
 from conftest import needs_plain_allocator
-from hostproc import (COMMANDS, MAX_FRAME, Client, close_with_reset, frame, hello, int_value, read_frame, refusal, reply,
+from hostproc import (MAX_FRAME, Client, commands, close_with_reset, frame, hello, int_value, read_frame, refusal, reply,
                       request, text_value, wait_until)
 
 SEED = 20261123
@@ -116,7 +116,7 @@ class Fuzzer:
             assert reply(read_frame(sock))[:2] == (number + 1, m.Success)
 
     def unknown_command(self):
-        command = self.rng.randrange(len(COMMANDS), 1 << 16)
+        command = self.rng.randrange(len(commands()), 1 << 16)
         with self.open() as sock:
             sock.sendall(request(5, command, self.bytes(60)))
             assert reply(read_frame(sock)) == (5, m.ApplicationError, f"no command number {command}")
