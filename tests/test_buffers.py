@@ -3,6 +3,8 @@ refused while a view is exported, filling from buffers with range checks, copies
 import array
 import ctypes
 import gc
+import struct
+import sys
 import weakref
 
 import pytest
@@ -288,6 +290,63 @@ def test_fill_refuses_and_leaves_the_vector_unchanged(name, source, error, messa
     with pytest.raises(error, match=message):
         vector.fill(source)
     assert [str(element) for element in vector] == before
+
+
+class Buffer(ctypes.Structure):
+    """A Py_buffer, as C consumers and exporters see it."""
+
+    _fields_ = [("buf", ctypes.c_void_p), ("obj", ctypes.c_void_p), ("len", ctypes.c_ssize_t),
+                ("itemsize", ctypes.c_ssize_t), ("readonly", ctypes.c_int), ("ndim", ctypes.c_int),
+                ("format", ctypes.c_char_p), ("shape", ctypes.POINTER(ctypes.c_ssize_t)),
+                ("strides", ctypes.POINTER(ctypes.c_ssize_t)), ("suboffsets", ctypes.c_void_p),
+                ("internal", ctypes.c_void_p)]
+
+
+def c_function(name, result, *arguments):
+    function = getattr(ctypes.PyDLL(None), name)
+    function.restype, function.argtypes = result, list(arguments)
+    return function
+
+
+GET_BUFFER = c_function("PyObject_GetBuffer", ctypes.c_int, ctypes.py_object, ctypes.POINTER(Buffer), ctypes.c_int)
+RELEASE_BUFFER = c_function("PyBuffer_Release", None, ctypes.POINTER(Buffer))
+MEMORYVIEW_FROM_BUFFER = c_function("PyMemoryView_FromBuffer", ctypes.py_object, ctypes.POINTER(Buffer))
+
+
+# What a consumer asks for (PyBUF_SIMPLE, _FORMAT, _ND, _STRIDES, _STRIDES | _FORMAT) -> the format,
+# the length of the one dimension and its stride that the buffer then describes.
+@pytest.mark.parametrize("flags, described", [
+    (0x0, (None, None, None)),
+    (0x4, (b"d", None, None)),
+    (0x8, (None, 3, None)),
+    (0x18, (None, 3, 8)),
+    (0x1C, (b"d", 3, 8)),
+])
+def test_the_exporter_describes_what_a_c_consumer_asks_for(flags, described):
+    view = Client3.vectord([1.0, 2.0, 3.0]).view()
+    buffer = Buffer()
+    assert GET_BUFFER(view.obj, ctypes.byref(buffer), flags) == 0
+    try:
+        shape = buffer.shape[0] if buffer.shape else None
+        stride = buffer.strides[0] if buffer.strides else None
+        assert (buffer.format, shape, stride) == described
+        assert (buffer.len, buffer.itemsize, buffer.ndim, buffer.readonly) == (24, 8, 1, 0)
+    finally:
+        RELEASE_BUFFER(ctypes.byref(buffer))
+        view.release()
+
+
+@pytest.mark.skipif(sys.byteorder != "little", reason="the network byte order is the machine's own")
+def test_a_buffer_in_the_network_byte_order_is_refused():
+    """No Python object exports the '!' order, but a C library's exporter may."""
+    data = (ctypes.c_char * 16).from_buffer_copy(struct.pack("!dd", 1.5, 2.5))
+    shape, stride = (ctypes.c_ssize_t * 1)(2), (ctypes.c_ssize_t * 1)(8)
+    described = Buffer(buf=ctypes.addressof(data), len=16, itemsize=8, readonly=1, ndim=1, format=b"!d",
+                       shape=shape, strides=stride)
+    vector = Client3.vectord([0.0, 0.0])
+    with pytest.raises(TypeError, match="from a buffer of format '!d'"):
+        vector.fill(MEMORYVIEW_FROM_BUFFER(ctypes.byref(described)))
+    assert list(vector) == [0.0, 0.0]
 
 
 @pytest.mark.parametrize("function", [_buffers.view, _buffers.copy, _buffers.exports, lambda v: _buffers.fill(v, b"")])

@@ -156,7 +156,7 @@ def test_member_functions_check_their_record(registered_classes, function, type_
 # ---- Field access on live records -------------------------------------------------------------
 
 def distinct(kind, number):
-    """A value of the kind for the field numbered `number` of a record: no two numbers or texts alike."""
+    """A value of the kind for the field numbered `number` of a record: no two numbers alike, flags alternating."""
     return {"b": number % 2 == 0, "f": number + 0.5, "d": number + 0.5}.get(kind, number + 1)
 
 

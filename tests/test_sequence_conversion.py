@@ -7,21 +7,9 @@ import pytest
 
 import _Client3 as m
 import companion
-from test_vectors import INSTANCES, by_instance
 from conftest import raises
-
-
-class Sequence:
-    """A plain script sequence (no list or tuple underneath the protocol)."""
-
-    def __init__(self, items):
-        self.items = list(items)
-
-    def __len__(self):
-        return len(self.items)
-
-    def __getitem__(self, index):
-        return self.items[index]
+from fuzzcalls import Hostile, Sequence  # a plain script sequence, and an object whose every conversion raises
+from test_vectors import INSTANCES, by_instance
 
 
 class Growing(Sequence):
@@ -67,16 +55,6 @@ class Withdrawn(Sequence):
         return self.items[index]
 
 
-class Failing(Sequence):
-    def __getitem__(self, index):
-        raise TypeError("no item")
-
-
-class BadLength(Sequence):
-    def __len__(self):
-        raise TypeError("no length")
-
-
 @by_instance
 def test_any_sequence_of_convertible_elements_and_own_vectors(inst):
     for kind in (list, tuple, Sequence):
@@ -104,7 +82,7 @@ def test_other_instances_proxy_is_not_read_as_a_sequence(inst):
 @by_instance
 def test_refused_sources_leave_only_the_overload_message(inst):
     """Objects that are no sequence, sequences that fail, and sequences with one refused element."""
-    for source in ({1, 2}, {0: 1}, (x for x in ()), 1.5, Failing([1]), BadLength([]),
+    for source in ({1, 2}, {0: 1}, (x for x in ()), 1.5, Sequence([1], fail_at=0), Hostile(TypeError),
                    [inst.samples[0], inst.wrong], (inst.wrong,), Sequence([inst.wrong, inst.samples[0]])):
         raises(TypeError, inst.new_refused, inst.new, source)
 
