@@ -56,38 +56,6 @@ def test_a_view_shows_the_vectors_own_storage_both_ways(name, format, dtype, val
     assert view[1] == written
 
 
-class Py_buffer(ctypes.Structure):
-    """The C buffer structure, for asking an exporter directly with the flags of a C consumer."""
-    _fields_ = [("buf", ctypes.c_void_p), ("obj", ctypes.py_object), ("len", ctypes.c_ssize_t),
-                ("itemsize", ctypes.c_ssize_t), ("readonly", ctypes.c_int), ("ndim", ctypes.c_int),
-                ("format", ctypes.c_char_p), ("shape", ctypes.POINTER(ctypes.c_ssize_t)),
-                ("strides", ctypes.POINTER(ctypes.c_ssize_t)), ("suboffsets", ctypes.c_void_p),
-                ("internal", ctypes.c_void_p)]
-
-
-PyBUF_SIMPLE, PyBUF_FORMAT, PyBUF_ND, PyBUF_STRIDES = 0, 0x4, 0x8, 0x18
-
-
-@pytest.mark.parametrize("flags, has_format, has_shape, has_strides", [
-    (PyBUF_SIMPLE, False, False, False),
-    (PyBUF_FORMAT, True, False, False),
-    (PyBUF_ND, False, True, False),
-    (PyBUF_STRIDES, False, True, True),
-])
-def test_a_buffer_holds_what_its_consumer_asked_for(flags, has_format, has_shape, has_strides):
-    exporter = Client3.vectord([1.0, 2.0, 3.0]).view().obj
-    get, release = ctypes.pythonapi.PyObject_GetBuffer, ctypes.pythonapi.PyBuffer_Release
-    get.argtypes = [ctypes.py_object, ctypes.POINTER(Py_buffer), ctypes.c_int]
-    release.argtypes = [ctypes.POINTER(Py_buffer)]
-    buffer = Py_buffer()
-    assert get(exporter, ctypes.byref(buffer), flags) == 0
-    try:
-        assert (buffer.format is not None, bool(buffer.shape), bool(buffer.strides)) == (has_format, has_shape, has_strides)
-        assert buffer.len == 3 * 8
-    finally:
-        release(ctypes.byref(buffer))
-
-
 @pytest.mark.parametrize("name, format, dtype, values, written", NUMERIC)
 def test_numpy_asarray_is_the_vector_without_a_copy(name, format, dtype, values, written):
     vector = getattr(Client3, name)(values)
