@@ -81,7 +81,7 @@ def unowned(proxy):
 
 
 @pytest.mark.parametrize("operator", ["__eq__", "__ne__", "__add__", "__sub__"])
-@pytest.mark.parametrize("other", [3.5, "x", object(), unowned(m.new_vectord())])
+@pytest.mark.parametrize("other", [3.5, unowned(m.new_vectord())])
 def test_operators_answer_not_implemented(operator, other):
     iterator = m.vectord_begin(m.new_vectord([1.0]))
     assert getattr(m, "SwigPyIterator_" + operator)(iterator, other) is NotImplemented
@@ -92,7 +92,7 @@ def test_operators_answer_not_implemented(operator, other):
 # (name, second argument or () to pass only 1.5) -> exception and text
 @pytest.mark.parametrize("name, second, error, text", [
     (name, None, ValueError, f"invalid null reference in method 'SwigPyIterator_{name}', argument 2 of type "
-                             "'swig::SwigPyIterator const &'") for name in ("distance", "equal", "__eq__", "__ne__", "__sub__")
+                             "'swig::SwigPyIterator const &'") for name in ("distance", "__eq__")
 ] + [
     ("value", (), TypeError, "in method 'SwigPyIterator_value', argument 1 of type 'swig::SwigPyIterator const *'"),
     ("next", (), TypeError, "in method 'SwigPyIterator_next', argument 1 of type 'swig::SwigPyIterator *'"),

@@ -50,19 +50,6 @@ def test_repr_of_a_chain_that_loops_shows_each_proxy_once(loop):
     assert repr(proxies[0]) == "".join(shown(proxy, SAFE_STRING_NAME) for proxy in proxies)
 
 
-def test_proxy_type_object():
-    proxy = _Client3.new_SafeString()
-    kind = type(proxy)
-    assert (kind.__name__, kind.__doc__) == ("SwigPyObject", "Swig object carries a C/C++ instance pointer")
-    # (The table's "__repr__" entry is shadowed by the representation slot's own wrapper.)
-    assert [getattr(kind, name).__doc__ for name in ("disown", "acquire", "own", "append", "next")] == [
-        "releases ownership of the pointer", "acquires ownership of the pointer", "returns/sets ownership of the pointer",
-        "appends another 'this' object", "returns the next 'this' object"]
-    for call, error in ((lambda: hash(proxy), TypeError), (lambda: setattr(proxy, "anything", 1), AttributeError),
-                        (kind, TypeError)):
-        pytest.raises(error, call)
-
-
 # The descriptors take no part.
 @pytest.mark.parametrize("left, right, equal", [
     ((SAFE_STRING, 0x10), (SAFE_STRING, 0x10), True), ((SAFE_STRING, 0x10), ("_p_int", 0x10), True),

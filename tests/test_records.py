@@ -141,18 +141,6 @@ def test_arguments_are_checked(name, field, kind):
         assert setter(None, text("x") if kind == "s" else {"b": True, "f": 1.5, "d": 1.5}.get(kind, 1)) is None
 
 
-@pytest.mark.parametrize("function,type_text_", [
-    ("Output_Result_Error", NS + "Output_Result const *"),
-    ("Output_GetCommandInfo_DefaultOutputString", NS + "Output_GetCommandInfo *"),
-])
-def test_member_functions_check_their_record(registered_classes, function, type_text_):
-    message = f"in method '{function}', argument 1 of type '{type_text_}'"
-    # A Type_Parameter is a record but not an output record.
-    for wrong in (1, text("x"), registered_classes["Type_Parameter"]()):
-        raises(TypeError, message, fn(function), wrong)
-    raises(ValueError, "invalid null reference " + message, fn(function), None)
-
-
 # ---- Field access on live records -------------------------------------------------------------
 
 def distinct(kind, number):

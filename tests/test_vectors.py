@@ -138,14 +138,6 @@ def test_no_element_in_an_empty_vector(inst, index):
     assert inst.fn("size")(v) == 0
 
 
-@by_instance
-def test_append(inst):
-    for name in ("append", "push_back"):
-        v = inst.new()
-        assert [inst.fn(name)(v, item) for item in inst.samples] == [None] * 5
-        assert inst.read(v) == inst.samples
-
-
 # Every function that takes an element: its arguments after self, given an iterator at the vector's
 # begin and the element, and the element's argument number; None where the overload test refuses it.
 @by_instance
