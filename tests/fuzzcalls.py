@@ -18,10 +18,12 @@ import math
 import os
 import random
 import re
+import socket
 import subprocess
 import sys
 import tempfile
 import time
+from concurrent.futures import ThreadPoolExecutor
 
 HERE = os.path.dirname(os.path.abspath(__file__))
 
@@ -214,8 +216,8 @@ class Batch:
 
     def fresh_iterator(self):
         kind = self.rng.choice(list(self.vectors))
-        vector = self.rng.choice(self.vectors[kind])
-        return self.made(kind + "_" + self.rng.choice(["iterator", "begin", "end", "rbegin", "rend"]), vector)
+        start = self.rng.choice(["iterator", "begin", "end", "rbegin", "rend"])
+        return self.made(kind + "_" + start, self.rng.choice(self.vectors[kind]))
 
     def fresh(self):
         """An owning proxy made for one call: a vector, a text, a parameter or a settings record."""
@@ -386,7 +388,7 @@ class Batch:
 
 
 def closed_port():
-    import socket
+    """A loopback port that nothing listens on."""
     with socket.socket() as s:
         s.bind(("127.0.0.1", 0))
         return s.getsockname()[1]
@@ -412,12 +414,13 @@ def run_batch(seed, calls, timeout):
     with tempfile.TemporaryDirectory() as folder:
         host = hostproc.start("--frames", "30", log_path=os.path.join(folder, "host.log"))
         try:
-            return _run_child(seed, calls, host.port, folder, timeout)
+            return run_child(seed, calls, host.port, folder, timeout)
         finally:
             host.stop()
 
 
-def _run_child(seed, calls, port, folder, timeout):
+def run_child(seed, calls, port, folder, timeout):
+    """Runs the batch's child; a child that dies is run again with its calls traced."""
     command = [sys.executable, "-X", "faulthandler", os.path.abspath(__file__), "--child",
                "--seed", str(seed), "--calls", str(calls), "--port", str(port)]
     # Under the sanitizers, memory errors are looked for but not leaks: a batch registers random classes,
@@ -443,18 +446,13 @@ def _run_child(seed, calls, port, folder, timeout):
 
 def fuzz(seed, calls, batch, jobs=1, timeout=600):
     """Runs `calls` calls in batches of `batch` (seeds seed, seed+1, ...); returns (crashes, system errors)."""
-    crashes, errors = [], set()
-    seeds = list(range(seed, seed + max(1, -(-calls // batch))))
-    running = []
-    from concurrent.futures import ThreadPoolExecutor
+    sizes = [min(batch, calls - start) for start in range(0, calls, batch)]
+    seeds = range(seed, seed + len(sizes))
     with ThreadPoolExecutor(jobs) as pool:
-        running = [pool.submit(run_batch, s, min(batch, calls - i * batch), timeout) for i, s in enumerate(seeds)]
-        for future in running:
-            crash, found = future.result()
-            if crash:
-                crashes.append(crash)
-            errors.update(found)
-    return crashes, sorted(errors)
+        results = list(pool.map(run_batch, seeds, sizes, [timeout] * len(sizes)))
+    crashes = [crash for crash, _ in results if crash]
+    errors = sorted({error for _, found in results for error in found})
+    return crashes, errors
 
 
 def main():
@@ -468,11 +466,8 @@ def main():
     parser.add_argument("--port", type=int, default=0, help=argparse.SUPPRESS)
     options = parser.parse_args()
     if options.child:
-        if options.trace:
-            with open(options.trace, "w") as trace:
-                child(options.seed, options.calls, options.port, trace)
-        else:
-            child(options.seed, options.calls, options.port, None)
+        trace = open(options.trace, "w") if options.trace else None
+        child(options.seed, options.calls, options.port, trace)
         return 0
     print("calls whose behaviour is undefined, not made:")
     for rule in UNDEFINED:
