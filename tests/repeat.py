@@ -64,17 +64,13 @@ def walk(iterator):
 
 def shapes(classes, client, connected):
     """(family, shape, one call) for every family; the classes make proxies that free their objects."""
-    text = classes["SafeString"]("kept")
     vector = classes["vectord"]([1.0, 2.0, 3.0])
     texts = classes["vectorss"](["a", "b"])
     ints = classes["vectori"]([1])
     record = classes["Output_CircleFitSettings"]()
     yield "proxy", "new and delete", lambda: classes["SafeString"]("kept")
-    yield "proxy", "wrong type", lambda: expect(TypeError, m.SafeString_IsEmpty, 5)
     yield "arguments", "wrong count", lambda: expect(TypeError, m.ZarvoPelluxPostClient_Connect, client)
     yield "scalar", "int out of range", lambda: expect(OverflowError, m.vectori_append, ints, 2 ** 40)
-    yield "scalar", "float that raises", lambda: expect(TypeError, m.vectord_append, vector, "x")
-    yield "text", "value of a kept text", lambda: m.SafeString_Value(text)
     yield "text", "overload that does not match", lambda: expect(TypeError, m.new_SafeString, b"\xff", 1)
     yield "vector", "append and pop", lambda: (m.vectord_append(vector, 4.0), m.vectord_pop(vector))
     yield "vector", "index out of range", lambda: expect(IndexError, m.vectord___getitem__, vector, 10)
@@ -83,7 +79,6 @@ def shapes(classes, client, connected):
                                               m.vectord___delitem__(vector, slice(3, 5)))
     yield "slice", "extended slice of a wrong size", lambda: expect(ValueError, m.vectord___setitem__, vector, slice(0, 3, 2), [1.0])
     yield "iterator", "walk", lambda: walk(m.vectord_iterator(vector))
-    yield "iterator", "past the end", lambda: expect(StopIteration, m.SwigPyIterator_value, m.vectord_end(vector))
     yield "sequence", "lists as vector arguments", lambda: m.ZarvoPelluxPostClient_SetTrajectory(
         client, "Alice", "LANK", [1.0, 2.0], (3.0, 4.0), [5.0, 6.0], [True, False])
     yield "sequence", "bad element", lambda: expect(TypeError, m.ZarvoPelluxPostClient_SetTrajectory,

@@ -164,8 +164,6 @@ REGISTER = "_Client3.SafeString_swigregister(type('S', (), {%s})); "
     (REGISTER % "'__swig_destroy__': _Client3.delete_SafeString" + "[_Client3.new_SafeString() for i in range(1000)]", ""),
     ("p = peer.make('_p_int', 64, 3); del p", LEAK.format("LONG32 *")),
     ("p = peer.make(None, 64, 3); del p", LEAK.format("unknown")),
-    ("p = peer.make('_p_ZarvoSDKClientCPP__Output_GetTrialName', 64, 3); del p",
-     LEAK.format("_p_ZarvoSDKClientCPP__Output_GetTrialName")),
     # A proxy that acquired ownership later leaks like any other owner.
     ("p = peer.make('_p_char', 64, 2); p.acquire(); del p", LEAK.format("char *")),
     # Every class that scripts make and delete (the records among them) has its destructor: no line.
