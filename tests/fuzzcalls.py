@@ -63,25 +63,10 @@ class Hostile:
     def __init__(self, error=ValueError):
         self.error = error
 
-    def __index__(self):
-        raise self.error("__index__")
+    def conversion(self, *args):
+        raise self.error("hostile")
 
-    __int__ = __index__
-
-    def __float__(self):
-        raise self.error("__float__")
-
-    def __len__(self):
-        raise self.error("__len__")
-
-    def __getitem__(self, index):
-        raise self.error("__getitem__")
-
-    def __iter__(self):
-        raise self.error("__iter__")
-
-    def __bool__(self):
-        raise self.error("__bool__")
+    __index__ = __int__ = __float__ = __len__ = __getitem__ = __iter__ = __bool__ = conversion
 
     def __repr__(self):
         return f"Hostile({self.error.__name__})"

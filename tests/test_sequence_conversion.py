@@ -105,11 +105,13 @@ def test_none_is_a_null_reference(inst):
 
 
 @pytest.mark.parametrize("prefix, source, expected", [
-    ("vectord", (1.0, 2), [1.0, 2.0]), ("vectorf", [3, 0.5], [3.0, 0.5]), ("vectorss", "ab", ["a", "b"]),
+    ("vectord", (1.0, 2), [1.0, 2.0]),
+    ("vectorf", [3, 0.5], [3.0, 0.5]),
+    ("vectorss", "ab", ["a", "b"]),
     ("vectorss", [b"bytes", "t\u00e9xt", "a\x00b"], ["bytes", "t\u00e9xt", "a"]),
-    ("vectorull", range(2**64 - 2, 2**64), [2**64 - 2, 2**64 - 1]), ("vectori", [True, -5], [1, -5]),
-    ("vectorb", [True, 1], None), ("vectori", [2**31], None), ("vectorull", [-1], None), ("vectorf", [1e39], None),
-    ("vectord", [10**400], None), ("vectorss", [1], None),
+    ("vectorull", range(2**64 - 2, 2**64), [2**64 - 2, 2**64 - 1]),
+    ("vectori", [True, -5], [1, -5]),
+    ("vectord", [10**400], None),  # (each vector's own refused element: test_refused_sources_leave_only_the_overload_message)
 ])
 def test_elements_follow_the_scalar_rules(prefix, source, expected):
     inst = next(i for i in INSTANCES if i.prefix == prefix)
