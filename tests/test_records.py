@@ -194,14 +194,6 @@ def test_base_functions_accept_any_record(registered_classes, peer, name, made):
     assert m.SafeString_Value(m.Output_Result_ResultString_get(record)) == "why"
 
 
-@pytest.mark.parametrize("name", [r[0] for r in CREATABLE])
-def test_new_returns_an_owning_bare_proxy(registered_classes, name):
-    bare = fn("new_" + name)()
-    assert type(bare).__name__ == "SwigPyObject" and bare.own() is True and f"'{NS}{name} *'" in repr(bare)
-    assert registered_classes[name]().this.own() is True
-    assert fn("delete_" + name)(bare) is None and bare.own() is False  # disowned: its release destroys nothing twice
-
-
 # ---- Scalar conversion rules ------------------------------------------------------------------
 
 Int, Float = type("Int", (int,), {}), type("Float", (float,), {})
