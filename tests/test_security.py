@@ -45,6 +45,7 @@ def receive_all(sock):
 @pytest.mark.parametrize("host_from_env, options, client_env, accepted", [
     (False, "token=", None, False),
     (False, "token=correct hors", None, False),
+    (False, "token=correct hors", None, False),
     (False, "token=correct horse!", None, False),
     (False, "timeout=2000&token=correct horse&connect=2000", None, True),
     (False, "", TOKEN, True),                         # the client's token from its environment
