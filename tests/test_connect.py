@@ -1,5 +1,6 @@
 """Why a Connect failed: each cause provoked for real on loopback, and the record's code and text
-(the code's own text, then the address and port, then the cause)."""
+(the code's own text, then the address and port, then the cause). The application's own refusals
+(its access token, its limit of clients) are in test_security.py and test_host.py."""
 import contextlib
 import socket
 import sys
@@ -9,7 +10,6 @@ import pytest
 import _Client3 as m
 from hostproc import Client
 
-TOKEN = "correct horse"
 # No resolver sends this name anywhere: a label has at most 63 octets.
 TOO_LONG_A_LABEL = "x" * 64 + ".invalid"
 
@@ -25,31 +25,31 @@ def attempt(address, port):
 
 # ---- Places to connect to: each gives a host and a port; what it opens is closed after the test ----
 
-def closed_port(start_host, stack, family=socket.AF_INET, host="127.0.0.1"):
+def closed_port(stack, family=socket.AF_INET, host="127.0.0.1"):
     # A bound socket that does not listen refuses every connection to its port.
     sock = stack.enter_context(socket.socket(family))
     sock.bind((host, 0))
     return host, sock.getsockname()[1]
 
 
-def closed_ipv6_port(start_host, stack):
+def closed_ipv6_port(stack):
     try:
-        return closed_port(start_host, stack, socket.AF_INET6, "::1")
+        return closed_port(stack, socket.AF_INET6, "::1")
     except OSError:
         pytest.skip("no IPv6 loopback")
 
 
-def unknown_name(start_host, stack):
+def unknown_name(stack):
     return TOO_LONG_A_LABEL, 8870
 
 
-def silent_port(start_host, stack):
+def silent_port(stack):
     # The system takes connections to a listening socket that nobody accepts from; nothing answers.
     sock = stack.enter_context(socket.create_server(("127.0.0.1", 0)))
     return "127.0.0.1", sock.getsockname()[1]
 
 
-def full_backlog(start_host, stack):
+def full_backlog(stack):
     # Linux drops the connection requests that a full backlog cannot queue: they go unanswered.
     if not sys.platform.startswith("linux"):
         pytest.skip("how a full backlog answers is Linux's")
@@ -60,21 +60,10 @@ def full_backlog(start_host, stack):
     return listener.getsockname()
 
 
-def host_with_token(start_host, stack):
-    host = start_host("--token", TOKEN)
-    return host.address, host.port
-
-
-def full_host(start_host, stack):
-    host = start_host("--max-clients", "1")
-    stack.callback(Client(host).close)  # the one client it serves
-    return host.address, host.port
-
-
 @pytest.fixture
-def place(start_host):
+def place():
     with contextlib.ExitStack() as stack:
-        yield lambda make: make(start_host, stack)
+        yield lambda make: make(stack)
 
 
 # (place, what follows the host in the address, the port (None: the place's), code, the cause)
@@ -92,18 +81,12 @@ CAUSES = [
     (unknown_name, "", None, m.NotConnected, "was not found: no host has that name"),
     (full_backlog, "?connect=300", None, m.NotConnected, "did not answer within 300 ms"),
     (silent_port, "?connect=300", None, m.NotConnected, "took the connection but did not answer within 300 ms"),
-    (host_with_token, "", None, m.ApplicationError,
-     "refused the client: the application needs its access token, and the client did not give it"),
-    (host_with_token, "?token=correct hors", None, m.ApplicationError,
-     "refused the client: the access token the client gave is not the application's"),
-    (full_host, "", None, m.ApplicationError, "refused the client: the application serves at most 1 clients at once"),
 ]
 
 
 @pytest.mark.parametrize("make, options, port, code, cause", CAUSES,
                          ids=[f"{make.__name__}{options}" for make, options, *_ in CAUSES])
-def test_a_failed_connect_keeps_its_code_and_says_where_and_why(place, monkeypatch, make, options, port, code, cause):
-    monkeypatch.delenv("CLIENT3_TOKEN", raising=False)
+def test_a_failed_connect_keeps_its_code_and_says_where_and_why(place, make, options, port, code, cause):
     host, own_port = place(make)
     port = port or own_port
     where = f"[{host}]:{port}" if ":" in host else f"{host}:{port}"

@@ -104,35 +104,6 @@ def test_second_connect_replaces_the_first(start_host, clients):
     assert wait_until(lambda: refused.result("Connect", only_one.address, only_one.port)[0] == m.Success)
 
 
-@pytest.mark.parametrize("end, status", [("stop", 0), ("kill", -signal.SIGKILL)])
-def test_an_application_that_ended_is_seen_gone(start_host, clients, end, status):
-    host = start_host()
-    client = clients(host)
-    assert getattr(host, end)() == status
-    assert client.result("GetMarkerNames", "Alice") == (m.NotConnected, NOT_CONNECTED)
-    assert client.IsConnected() is False
-
-
-def _stopped(host):
-    with open(f"/proc/{host.process.pid}/stat") as stat:
-        return stat.read().rsplit(")", 1)[1].split()[0] == "T"
-
-
-@pytest.mark.skipif(not os.path.exists("/proc/self/stat"), reason="needs /proc to see that a process is stopped")
-def test_hung_application_times_out_and_is_seen_gone_when_killed(start_host, clients):
-    host = start_host()
-    client = clients(host, "timeout=300")
-    host.send(signal.SIGSTOP)
-    assert wait_until(lambda: _stopped(host))
-    started = time.monotonic()
-    assert client.result("GetSceneName") == (m.RequestTimedOut, TIMED_OUT)
-    assert 0.25 < time.monotonic() - started < 2
-    # Killed with the request still unread, the application's end resets the connection.
-    host.kill()
-    assert wait_until(lambda: client.IsConnected() is False)
-    assert client.result("GetSceneName") == (m.NotConnected, NOT_CONNECTED)
-
-
 def test_records_outlive_their_client(host):
     client = Client(host)
     names = client.record("GetMarkerNames", "Bob")
@@ -151,16 +122,13 @@ QUERIES = [
     ("GetSubjectNames", (), (["Alice", "Bob"], ["Walker", "Walker"], [True, True])),
     ("GetMarkerNames", ("Alice",), MARKERS),
     ("GetBoneNames", ("Alice", "Walker"), BONES),
-    ("GetBoneNames", ("Bob", ""), BONES),
     ("GetRootBone", ("Alice", "Walker"), "Pelvis"),
     ("GetBoneDetails", ("Alice", "Walker", "Pelvis"), ("", ["Thorax", "LeftThigh", "RightThigh"])),
     ("GetBoneDetails", ("Bob", "", "LeftFoot"), ("LeftShin", [])),
     ("GetConstraintNames", ("Bob", "Walker"), CONSTRAINTS),
-    ("GetConstraintDetails", ("Alice", "Walker", "LANK_LeftFoot"), (True, "LANK", "LeftFoot", [0, 24, 0], "Point")),
     ("GetConstraintDetails", ("Bob", "", "RASI_Pelvis"),
      (True, "RASI", "Pelvis", pytest.approx([18.2, -31.2, 0], rel=1e-6), "Point")),
     ("GetSubjectParamNames", ("Alice", "Walker"), PARAMETERS),
-    ("GetSubjectParamDetails", ("Alice", "Walker", "Height"), (1680, 1750, "mm", True)),
     ("GetSubjectParamDetails", ("Bob", "Walker", "Mass"), (pytest.approx(72.8, rel=1e-6), 70, "kg", True)),
     ("GetSubjectParamDetails", ("Bob", "", "RightLegLength"), (pytest.approx(988.0, rel=1e-6), 900, "mm", False)),
 ]
@@ -178,14 +146,10 @@ def test_query_of_the_demo_scene(client, operation, args, expected):
 REFUSALS = [
     ("GetMarkerNames", ("Carol",), m.ApplicationError, "no subject named 'Carol'"),
     ("GetBoneNames", ("Alice", "Runner"), m.ApplicationError, "subject 'Alice' has no skeleton named 'Runner'"),
-    ("GetRootBone", ("Carol", ""), m.ApplicationError, "no subject named 'Carol'"),
     ("GetBoneDetails", ("Alice", "Walker", "Tail"), m.ApplicationError, "subject 'Alice' has no bone named 'Tail'"),
-    ("GetConstraintNames", ("Bob", "Runner"), m.ApplicationError, "subject 'Bob' has no skeleton named 'Runner'"),
     ("GetConstraintDetails", ("Bob", "Walker", "LANK_Head"), m.ApplicationError,
      "subject 'Bob' has no constraint named 'LANK_Head'"),
-    ("GetSubjectParamNames", ("Carol", "Walker"), m.ApplicationError, "no subject named 'Carol'"),
     ("GetSubjectParamDetails", ("Bob", "Walker", "Age"), m.ApplicationError, "subject 'Bob' has no parameter named 'Age'"),
-    ("GetTrajectory", ("Alice", "XYZ"), m.ApplicationError, "subject 'Alice' has no marker named 'XYZ'"),
     ("GetTrajectory", ("alice", "LANK"), m.ApplicationError, "no subject named 'alice'"),
     ("GetTrajectoryAtFrame", ("Bob", "XYZ", 1), m.ApplicationError, "subject 'Bob' has no marker named 'XYZ'"),
     ("GetTrajectoryAtFrame", ("Alice", "LANK", 0), m.InvalidFrameNumber, "frame 0 is outside the take (1 to 1000)"),
@@ -193,7 +157,6 @@ REFUSALS = [
     ("GetTrajectoryAtFrame", ("Bob", "RANK", -2**31), m.InvalidFrameNumber,
      "frame -2147483648 is outside the take (1 to 1000)"),
     ("GetCommandInfo", ("Frobnicate",), m.ApplicationError, "no command named 'Frobnicate'"),
-    ("SetLanguage", ("xx",), m.ApplicationError, "'xx' is not a language of the application (en, de, fr, es, ja, zh)"),
     ("SetLanguage", ("EN",), m.ApplicationError, "'EN' is not a language of the application (en, de, fr, es, ja, zh)"),
     ("Log", ("verbose", "text"), m.ApplicationError, "'verbose' is not a log level (debug, info, warning, error)"),
     ("PSL", ("",), m.ApplicationError, "the command line is empty"),
@@ -232,7 +195,7 @@ def test_trajectories_hold_every_frame_and_read_zero_in_their_gaps(client, subje
 
 
 @pytest.mark.parametrize("subject, marker, frame", [
-    ("Alice", "LANK", 1), ("Alice", "LANK", 2), ("Bob", "RWRA", 500), ("Alice", "C7", 701), ("Bob", "LKNE", 1000),
+    ("Alice", "LANK", 1), ("Alice", "C7", 701), ("Bob", "LKNE", 1000),
 ])
 def test_trajectory_at_frame_is_element_frame_minus_one(client, subject, marker, frame):
     whole = client.GetTrajectory(subject, marker)
@@ -265,7 +228,7 @@ def test_writes_are_read_back_by_every_client(writable, clients):
 
 
 @pytest.mark.parametrize("lengths", [(999, 1000, 1000, 1000), (1000, 1001, 1000, 1000), (1000, 1000, 0, 1000),
-                                     (1000, 1000, 1000, 999), (0, 0, 0, 0)])
+                                     (1000, 1000, 1000, 999)])
 def test_set_trajectory_of_the_wrong_length_is_refused(writable, clients, lengths):
     client = clients(writable)
     before = client.GetTrajectory("Alice", "LANK")
@@ -299,7 +262,6 @@ def test_set_trajectory_at_frame_changes_that_frame_alone(writable, clients):
 @pytest.mark.parametrize("subject, marker, frame, code, message", [
     ("Alice", "LANK", 0, m.InvalidFrameNumber, "frame 0 is outside the take (1 to 1000)"),
     ("Alice", "LANK", 1001, m.InvalidFrameNumber, "frame 1001 is outside the take (1 to 1000)"),
-    ("Alice", "XYZ", 5, m.ApplicationError, "subject 'Alice' has no marker named 'XYZ'"),
     ("Carol", "LANK", 5, m.ApplicationError, "no subject named 'Carol'"),
 ])
 def test_set_trajectory_at_frame_refused(writable, clients, subject, marker, frame, code, message):
@@ -321,28 +283,16 @@ def test_every_command_is_listed_and_described(client):
         assert m.Output_GetCommandInfo_DefaultOutputString(info).startswith(f"{name}\n{description}\n----------------\n")
 
 
-@pytest.mark.parametrize("command, text", [
-    ("GetTrajectoryAtFrame",
-     "GetTrajectoryAtFrame\nA marker's position and existence flag at one frame.\n"
-     "----------------\nInput Parameters\n----------------\nSubject   \nMarker    \nFrame     0\n"
-     "-----------------\nOutput Parameters\n-----------------\n"
-     "X         double list\nY         double list\nZ         double list\nE         bool list\n"),
-    ("GetFrameCount",
-     "GetFrameCount\nThe number of frames in the take.\n"
-     "----------------\nInput Parameters\n----------------\nNone\n"
-     "-----------------\nOutput Parameters\n-----------------\nCount   unsigned int\n"),
-    ("SetSceneName",
-     "SetSceneName\nRenames the scene.\n"
-     "----------------\nInput Parameters\n----------------\nName   \n"
-     "-----------------\nOutput Parameters\n-----------------\nNone\n"),
-])
-def test_command_description_text(client, command, text):
-    assert m.Output_GetCommandInfo_DefaultOutputString(client.record("GetCommandInfo", command)) == text
+def test_command_description_text(client):
+    """The inputs' defaults and the outputs' types, as the application describes them."""
+    assert m.Output_GetCommandInfo_DefaultOutputString(client.record("GetCommandInfo", "GetTrajectoryAtFrame")) == (
+        "GetTrajectoryAtFrame\nA marker's position and existence flag at one frame.\n"
+        "----------------\nInput Parameters\n----------------\nSubject   \nMarker    \nFrame     0\n"
+        "-----------------\nOutput Parameters\n-----------------\n"
+        "X         double list\nY         double list\nZ         double list\nE         bool list\n")
 
 
 @pytest.mark.parametrize("command, outputs", [
-    ("GetFrameCount", [("Count", "1000")]),
-    ("GetSceneName", [("Name", "Demo"), ("Path", "")]),
     ("GetSubjectNames", [("Names", "Alice,Bob"), ("Models", "Walker,Walker"), ("Active", "true,true")]),
     ("GetServerInfo", [("Program", "Pellux Post"), ("MajorVersion", "1"), ("MinorVersion", "0"), ("PointVersion", "0"),
                        ("ReleaseType", "Release")]),
@@ -363,9 +313,7 @@ def test_process_request_writes_the_outputs_back(client, command, outputs):
 @pytest.mark.parametrize("command, message", [
     ("Frobnicate", "no command named 'Frobnicate'"),
     ("PSL", "'PSL' cannot be run by name"),
-    ("ProcessRequest", "'ProcessRequest' cannot be run by name"),
     ("GetSceneName", "'GetSceneName' has no parameter named 'Count'"),
-    ("GetMarkerNames", "'GetMarkerNames' has no parameter named 'Count'"),
 ])
 def test_process_request_refused_leaves_the_vector_alone(client, command, message):
     info = client.record("GetCommandInfo", "GetFrameCount")
@@ -379,7 +327,6 @@ def test_process_request_refused_leaves_the_vector_alone(client, command, messag
 
 
 @pytest.mark.parametrize("command, defaults, message", [
-    ("GetMarkerNames", [("Subject", "")], "no subject named ''"),
     ("GetTrajectoryAtFrame", [("Subject", ""), ("Marker", ""), ("Frame", "0")], "no subject named ''"),
     ("SetSceneName", [("Name", "")], "a scene name cannot be empty"),
     ("ObjectGetPath", [("Object", "0")], "no object with id 0"),
@@ -406,11 +353,6 @@ def test_psl_answers_with_name_value_lines(client, line, answer):
     assert client.PSL(line) == answer
 
 
-def test_every_language_is_set(client):
-    for language in ["en", "de", "fr", "es", "ja", "zh"]:
-        assert client.result("SetLanguage", language) == (m.Success, "OK")
-
-
 def test_log_lands_in_the_application_log(client, host):
     note = f"note {uuid.uuid4().hex}"
     client.Log("warning", note + "\nforged line")
@@ -428,10 +370,8 @@ FAULTS = [
     ("oversize@GetSceneName", "GetSceneName", (), m.ReplyParsingError, PARSING, False),
     ("close@GetSceneName", "GetSceneName", (), m.NotConnected, NOT_CONNECTED, False),
     ("text@GetSubjectParamDetails", "GetSubjectParamDetails", ("Bob", "Walker", "Mass"), m.ConversionError, CONVERSION, True),
-    ("text@GetConstraintDetails", "GetConstraintDetails", ("Bob", "", "C7_Thorax"), m.ConversionError, CONVERSION, True),
     ("frames=2", "GetTrajectoryAtFrame", ("Alice", "LANK", 5), m.ExpectedOneFrame, ONE_FRAME, True),
     ("frames=0", "GetTrajectoryAtFrame", ("Alice", "LANK", 5), m.ExpectedOneFrame, ONE_FRAME, True),
-    ("status=77@GetSceneName", "GetSceneName", (), m.UnknownStatus, "Unknown Error", True),
     ("status=-1@GetRootBone", "GetRootBone", ("Bob", ""), m.UnknownStatus, "Unknown Error", True),
     ("status=1004@GetSceneName", "GetSceneName", (), m.InvalidFrameNumber, "Frame number specified is invalid.", True),
 ]
@@ -483,8 +423,7 @@ def test_the_buffer_of_a_large_reply_is_let_go(start_host, clients):
 
 
 @pytest.mark.parametrize("fault, count", [
-    ("delay=1000@GetFrameCount", 0), ("garbage@GetFrameCount", 0), ("text@GetFrameCount", 0),
-    ("status=1003@GetFrameCount", 0), ("close@GetFrameCount", 0), ("oversize@GetFrameCount", 0),
+    ("delay=1000@GetFrameCount", 0), ("status=1003@GetFrameCount", 0), ("close@GetFrameCount", 0),
     ("garbage@GetSceneName", 250),
 ])
 def test_frame_count_is_zero_when_the_command_fails(start_host, clients, fault, count):
@@ -504,9 +443,6 @@ PEERS = [
     ("hello with other commands", hello(count=len(COMMANDS) - 1), False,
      f"this application speaks version 1 of the protocol with {len(COMMANDS)} commands"),
     ("oversized before hello", struct.pack("<I", MAX_FRAME + 1), False, None),
-    ("oversized after hello", struct.pack("<I", MAX_FRAME + 1), True, f"a frame may hold at most {MAX_FRAME} bytes"),
-    ("empty after hello", struct.pack("<I", 0), True, f"a frame may hold at most {MAX_FRAME} bytes"),
-    ("no request after hello", frame(b"\x00" + bytes(range(200))), True, "a frame that is not a request"),
 ]
 
 
@@ -537,7 +473,6 @@ def test_a_frame_begun_must_end_within_30_seconds(start_host, clients):
 
 MALFORMED = [
     # the request; the code and message of its reply
-    (request(7, len(COMMANDS)), m.ApplicationError, f"no command number {len(COMMANDS)}"),
     (request(7, "GetMarkerNames", int_value(5)), m.ApplicationError,
      "the request for 'GetMarkerNames' does not match the command: a value has the wrong type"),
     (request(7, "GetMarkerNames", text_value("Bob")[:-1]), m.ApplicationError,
@@ -549,7 +484,7 @@ MALFORMED = [
 
 
 @pytest.mark.parametrize("sent, code, message", MALFORMED,
-                         ids=["unknown command", "wrong type", "too short", "too long", "well formed"])
+                         ids=["wrong type", "too short", "too long", "well formed"])
 def test_malformed_request_is_refused_and_the_connection_stays(host, sent, code, message):
     with raw_connection(host) as sock:
         shake_hands(sock)
