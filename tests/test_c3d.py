@@ -27,7 +27,6 @@ READABLE = [
     "sample_07_16bitanalog.c3d", "sample_13_Dance.c3d", "sample_16_basketball.c3d",
     "sample_22_BKINtechnologies.c3d", "sample_30_admarche2.c3d", "sample_34_AlbertoINT.c3d",
 ]
-SET_01 = [name for name in READABLE if name.startswith("sample_01_")]
 TICKS_PER_SECOND = 705_600_000
 
 
@@ -112,18 +111,6 @@ def test_exported_take_is_read_back_by_the_independent_reader(app, name, tmp_pat
     assert written.analog.shape == original.analog.shape
     assert np.allclose(written.analog, original.analog, rtol=1e-6, atol=1e-9)
     assert written.groups == original.groups
-
-
-def test_the_six_forms_of_set_01_give_one_answer(app):
-    answers = []
-    for name in SET_01:
-        names = point_names(seen_in(name).labels)
-        import_take(app, CORPUS / name)
-        answers.append((app.GetFrameCount(), app.TimelineGetFrameRate(), names, trajectories(app, names)))
-    first = answers[0]
-    for answer in answers[1:]:
-        assert answer[:3] == first[:3]
-        assert np.array_equal(answer[3][0], first[3][0]) and np.array_equal(answer[3][1], first[3][1])
 
 
 def test_repeated_labels_and_a_short_frame_count_are_logged(app, host):

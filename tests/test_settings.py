@@ -169,12 +169,6 @@ def scene_with_line(app, path, record, line):
     return at + 1
 
 
-def test_the_scene_file_names_each_setting(app, tmp_path):
-    app.SaveFile(str(tmp_path / "a.scene"), "")
-    assert "settings Solving PriorImportance=1 MeanPoseRatio=1 NumThreads=0 ExtrapolateFingers=false FingerMultiplier=1\n" in (
-        tmp_path / "a.scene").read_text()
-
-
 @pytest.mark.parametrize("line, expected", [
     # A field the line leaves out (a file saved before the field was added) keeps its default.
     ("settings Solving PriorImportance=50 MeanPoseRatio=3 ExtrapolateFingers=true FingerMultiplier=2", (50, 3, 0, True, 2)),
