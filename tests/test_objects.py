@@ -38,8 +38,6 @@ def test_demo_scene_as_a_tree(app):
     assert app.ObjectGetChannels(marker) == "X,Y,Z"
     subjects, kinds = app.SceneGetObjectList("Subject")
     assert [app.ObjectGetPath(i) for i in subjects] == ["/Alice", "/Bob"] and kinds == ["Subject"] * 2
-    assert len(app.SceneGetObjectList("Marker")[0]) == 24
-    assert app.SceneGetActiveClip() == "Walk"
 
 
 @pytest.mark.parametrize("operation, args", [

@@ -141,6 +141,12 @@ CHAIN = [  # (operation, arguments) in an order that meets every precondition, f
 ]
 
 
+def run_chain(app, stages):
+    """Runs the first `stages` stages of CHAIN."""
+    for operation, args in CHAIN[:stages]:
+        getattr(app, operation)(*args)
+
+
 def state(app):
     """The take's pipeline state: the active clip's Text parameters, by name."""
     clip = app.SceneGetObject("/Walk")[0]
@@ -286,8 +292,7 @@ NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the ref
 
 @pytest.mark.parametrize("ran, operation, args, message", NEEDS)
 def test_a_stage_whose_need_has_not_run_is_refused_and_changes_nothing(app, tmp_path, ran, operation, args, message):
-    for earlier, earlier_args in CHAIN[:ran]:
-        getattr(app, earlier)(*earlier_args)
+    run_chain(app, ran)
     before = app.scene_file(tmp_path / "scene")
     assert message in app.result(operation, *args)[1]
     assert app.scene_file(tmp_path / "scene") == before
@@ -302,8 +307,7 @@ def test_quick_post_runs_its_stages_in_order_until_one_cannot_run(app):
     assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineAutoLabel': 'OfflineAutoLabel' needs 'OfflineReconstruct' to run first")
     assert state(app) == {}
-    for operation, args in CHAIN[:4]:
-        getattr(app, operation)(*args)
+    run_chain(app, 4)
     assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineSolve': 'OfflineSolve' needs 'OfflineCalibrateSolvingSubjects' to run first for subject 'Alice'")
     assert {"Pipeline OfflineAutoLabel Alice", "Pipeline OfflineFixOcclusion Alice"} <= set(state(app))
@@ -320,11 +324,6 @@ def test_quick_post_runs_its_stages_in_order_until_one_cannot_run(app):
 
 
 # ---- What the stages compute: templates, labels, offsets, bone paths ----
-
-def run_chain(app, stages):
-    for operation, args in CHAIN[:stages]:
-        getattr(app, operation)(*args)
-
 
 def template(app, subject, marker):
     """A marker's label template: its offset from the subject's centroid and its reach."""
