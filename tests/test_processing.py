@@ -40,10 +40,6 @@ def set_occlusion(app, field, value):
     app.OfflineSetOcclusionFixingSettings(settings)
 
 
-def unseen(app, subject):
-    return {marker: int((~trajectory(app, subject, marker)[1]).sum()) for marker in app.GetMarkerNames(subject)}
-
-
 def distance(a, b):
     """Each frame's distance between two trajectories (3 x frames)."""
     return np.sqrt(((a - b) ** 2).sum(axis=0))
@@ -52,10 +48,7 @@ def distance(a, b):
 @pytest.mark.parametrize("marker, first, length, tolerance", [
     ("LFHD", 300, 40, RIGID),   # RFHD is on the head too
     ("LASI", 300, 50, RIGID),   # the longest gap the defaults fill
-    ("LKNE", 300, 5, CUBIC),    # alone on its segment
-    ("LKNE", 300, 20, CUBIC),
-    ("LANK", 300, 10, CUBIC),
-    ("RWRA", 300, 15, CUBIC),
+    ("LKNE", 300, 20, CUBIC),   # alone on its segment
     ("LANK", 907, 20, CUBIC),   # the farthest off of the measured fills away from a turn
     ("LANK", 501, 20, CUBIC_ACROSS_A_TURN),  # and across one: the bounce turns at frame 501
 ])
@@ -65,17 +58,6 @@ def test_a_cut_gap_is_filled_close_to_the_motion_it_was_cut_from(app, marker, fi
     filled, seen = trajectory(app, "Alice", marker)
     assert seen[first:first + length].all()
     assert distance(filled, truth)[first:first + length].max() < tolerance
-
-
-def test_the_demo_gap_of_bob_lank_is_filled_within_the_cubic_bound(app, start_host, clients):
-    # A longer take has the same motion frame by frame, and its gaps elsewhere: it sees what the
-    # 1,000-frame take's 0.2 s gap hides.
-    truth, seen = trajectory(clients(start_host("--frames", "2000")), "Bob", "LANK")
-    gap = ~trajectory(app, "Bob", "LANK")[1]
-    assert gap.sum() == 20 and seen[:1000][gap].all()
-    app.OfflineFixOcclusion("Bob", "")
-    filled = trajectory(app, "Bob", "LANK")[0]
-    assert distance(filled, truth[:, :1000])[gap].max() < CUBIC
 
 
 def first_slope(x):
@@ -118,19 +100,6 @@ def test_longer_gaps_than_the_transition_time_stay_and_the_rest_are_untouched(ap
     assert trajectory(app, "Alice", "LFHD")[1].all()
 
 
-def test_the_demo_gaps_of_every_subject_are_filled_up_to_the_longest_allowed(app):
-    assert unseen(app, "Alice")["RWRA"] == 80
-    app.OfflineFixOcclusion("", "")
-    assert unseen(app, "Alice") == {marker: 80 if marker == "RWRA" else 0 for marker in app.GetMarkerNames("Alice")}
-    assert set(unseen(app, "Bob").values()) == {0}
-
-
-def test_only_the_named_subject_is_filled(app):
-    bob = unseen(app, "Bob")
-    app.OfflineFixOcclusion("Alice", "")
-    assert unseen(app, "Bob") == bob
-
-
 def test_without_apply_fixed_markers_the_values_are_written_and_the_frames_stay_unseen(app):
     set_occlusion(app, "ApplyFixedMarkers", False)
     truth = cut(app, "Bob", "RFHD", 500, 30)
@@ -170,6 +139,12 @@ CHAIN = [  # (operation, arguments) in an order that meets every precondition, f
     ("OfflineSolve", ("Alice",)),
     ("OfflineRetarget", ("Alice",)),
 ]
+
+
+def run_chain(app, stages):
+    """Runs the first `stages` stages of CHAIN."""
+    for operation, args in CHAIN[:stages]:
+        getattr(app, operation)(*args)
 
 
 def state(app):
@@ -317,8 +292,7 @@ NEEDS = [  # (how many stages of CHAIN ran before, operation, arguments, the ref
 
 @pytest.mark.parametrize("ran, operation, args, message", NEEDS)
 def test_a_stage_whose_need_has_not_run_is_refused_and_changes_nothing(app, tmp_path, ran, operation, args, message):
-    for earlier, earlier_args in CHAIN[:ran]:
-        getattr(app, earlier)(*earlier_args)
+    run_chain(app, ran)
     before = app.scene_file(tmp_path / "scene")
     assert message in app.result(operation, *args)[1]
     assert app.scene_file(tmp_path / "scene") == before
@@ -333,8 +307,7 @@ def test_quick_post_runs_its_stages_in_order_until_one_cannot_run(app):
     assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineAutoLabel': 'OfflineAutoLabel' needs 'OfflineReconstruct' to run first")
     assert state(app) == {}
-    for operation, args in CHAIN[:4]:
-        getattr(app, operation)(*args)
+    run_chain(app, 4)
     assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineSolve': 'OfflineSolve' needs 'OfflineCalibrateSolvingSubjects' to run first for subject 'Alice'")
     assert {"Pipeline OfflineAutoLabel Alice", "Pipeline OfflineFixOcclusion Alice"} <= set(state(app))
@@ -350,23 +323,7 @@ def test_quick_post_runs_its_stages_in_order_until_one_cannot_run(app):
     assert state(app)["Pipeline OfflineSolve Alice"].startswith("bones=13,frames=920;")
 
 
-def test_a_stage_records_the_settings_it_ran_with(app):
-    for operation, args in CHAIN[:8]:
-        getattr(app, operation)(*args)
-    settings = app.record("OfflineGetSolvingSettings")
-    m.Output_SolvingSettings_PriorImportance_set(settings, 5.5)
-    app.OfflineSetSolvingSettings(settings)
-    app.OfflineSolve("Alice")
-    assert "PriorImportance=5.5," in state(app)["Pipeline OfflineSolve Alice"]
-    assert "PriorImportance=1," in state(app)["Pipeline OfflineCalibrateSolvingSubjects Alice"]
-
-
 # ---- What the stages compute: templates, labels, offsets, bone paths ----
-
-def run_chain(app, stages):
-    for operation, args in CHAIN[:stages]:
-        getattr(app, operation)(*args)
-
 
 def template(app, subject, marker):
     """A marker's label template: its offset from the subject's centroid and its reach."""
@@ -401,7 +358,6 @@ def move_to_new_marker(app, subject, marker, new):
 
 @pytest.mark.parametrize("scramble, moved", [
     (lambda app: swap(app, "Alice", "LANK", "RANK"), 1965),   # both ankles, each seen but in its gap
-    (lambda app: swap(app, "Alice", "LFHD", "STRN"), 2000),
     (lambda app: move_to_new_marker(app, "Alice", "LKNE", "U1"), 1000),
 ])
 def test_automatic_labelling_gives_each_trajectory_back_its_label(app, scramble, moved):
@@ -414,17 +370,6 @@ def test_automatic_labelling_gives_each_trajectory_back_its_label(app, scramble,
         assert (now == seen).all(), marker
         assert (after[:, seen] == values[:, seen]).all(), marker
     assert f"moved={moved},dropped=0;" in state(app)["Pipeline OfflineAutoLabel Alice"]
-
-
-def test_a_point_no_label_reaches_stays_unlabelled(app):
-    run_chain(app, 4)
-    app.SceneCreateObject("Marker", "U1", app.SceneGetObject("/Alice")[0], "")
-    x, y, z, seen = app.GetTrajectory("Alice", "LFHD")
-    far = [value + 5000 for value in x]
-    app.SetTrajectory("Alice", "U1", far, y, z, seen)
-    app.OfflineAutoLabel("Alice", "")
-    assert trajectory(app, "Alice", "U1")[0][0].tolist() == far
-    assert trajectory(app, "Alice", "LFHD")[1].tolist() == seen
 
 
 def test_labelling_refuses_templates_closer_than_the_separation_distance(app, tmp_path):
@@ -440,7 +385,6 @@ def test_labelling_refuses_templates_closer_than_the_separation_distance(app, tm
 
 @pytest.mark.parametrize("constraint, markers", [
     ("LFHD_Head", ("LFHD", "RFHD")),   # half the way from one head marker to the other
-    ("STRN_Thorax", ("STRN", "C7")),
     ("RASI_Pelvis", ("RASI", "LASI")),
     ("LWRA_LeftHand", ("LWRA",)),      # alone on its bone: no offset
 ])
@@ -472,16 +416,6 @@ def test_solving_places_each_bone_where_its_markers_put_it(app):
     assert np.abs(pelvis - centre).max() < 1e-3
 
 
-def test_a_bone_with_one_marker_unseen_is_still_at_the_centre_of_its_markers(app):
-    run_chain(app, 9)
-    heads = [trajectory(app, "Alice", marker)[0][:, 504] for marker in ("LFHD", "RFHD")]
-    cut(app, "Alice", "LFHD", 500, 10)
-    app.OfflineSolve("Alice")
-    head, keyed = bone_path(app, "Alice", "Pelvis/Thorax/Head", "T", [505])
-    assert keyed.all()
-    assert np.abs(head[:, 0] - np.mean(heads, axis=0)).max() < 1e-3
-
-
 def test_a_bone_without_markers_follows_its_parent_and_one_whose_markers_are_unseen_has_no_key(app):
     run_chain(app, 9)
     pelvis = bone_path(app, "Alice", "Pelvis", "T", FRAMES)[0]
@@ -507,13 +441,6 @@ def test_retargeting_scales_each_bone_offset_from_the_root_to_the_standard_heigh
     head = bone_path(app, "Alice", "Pelvis/Thorax/Head", "T", FRAMES)[0]
     retargeted = bone_path(app, "Alice", "Pelvis/Thorax/Head", "R", FRAMES)[0]
     assert np.abs(retargeted - (pelvis + (head - pelvis) * 1750 / 1680)).max() < 1e-6
-
-
-def test_solved_bone_channels_are_kept_in_the_scene_file(app, tmp_path):
-    run_chain(app, 10)
-    solved = app.scene_file(tmp_path / "solved.scene")
-    app.LoadFile(str(tmp_path / "solved.scene"))
-    assert app.scene_file(tmp_path / "again.scene") == solved
 
 
 def hide_marker(app, subject="Alice"):

@@ -136,13 +136,6 @@ def test_a_lower_bound_may_not_exceed_its_upper_bound(app, low, high):
     assert values(app, "Reconstruct") == before
 
 
-def test_a_getter_hands_out_a_copy(app):
-    settings = get(app, "Solving")
-    put(settings, "Solving", "PriorImportance", 50)
-    assert values(app, "Solving")[0] == 1
-    assert m.Output_SolvingSettings_PriorImportance_get(settings) == 50
-
-
 def test_the_settings_are_kept_in_the_scene_file_and_reset_by_a_new_scene(app, tmp_path):
     changed = {"LabelROM": ("SeparationDistance", 12.5), "LabelingSubjectCalibration": ("Quality", "High"),
                "OcclusionFixing": ("ApplyFixedMarkers", False), "CircleFit": ("NumThreads", 8)}
@@ -167,12 +160,6 @@ def scene_with_line(app, path, record, line):
     lines[at] = line
     path.write_text("\n".join(lines))
     return at + 1
-
-
-def test_the_scene_file_names_each_setting(app, tmp_path):
-    app.SaveFile(str(tmp_path / "a.scene"), "")
-    assert "settings Solving PriorImportance=1 MeanPoseRatio=1 NumThreads=0 ExtrapolateFingers=false FingerMultiplier=1\n" in (
-        tmp_path / "a.scene").read_text()
 
 
 @pytest.mark.parametrize("line, expected", [

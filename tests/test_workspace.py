@@ -128,7 +128,6 @@ def test_database_refusals_keep_what_is_current(app, tmp_path):
     cases = [
         ("DatabaseCreate", str(work), "db"), f"'{work / 'db'}' exists already",
         ("DatabaseCreate", str(work / "missing"), "x"), f"no directory at '{work / 'missing'}'",
-        ("DatabaseCreate", str(work / "file"), "x"), f"no directory at '{work / 'file'}'",
         ("DatabaseCreate", str(work), ".."), "'..' cannot name a database: it climbs out of its directory",
         ("DatabaseCreate", str(work), "a/b"), "'a/b' cannot name a database: it holds a '/', '\\' or ':'",
         ("DatabaseCreate", str(work), ""), "'' cannot name a database: it is empty",
@@ -137,9 +136,7 @@ def test_database_refusals_keep_what_is_current(app, tmp_path):
         ("DatabaseSetCurrent", "Session", "Session 1/.."), "'Session 1/..' cannot name a session: it holds a '/', '\\' or ':'",
         ("DatabaseSetCurrent", "Session", "Day 9"), "there is no session 'Day 9'",
         ("DatabaseSetCurrent", "Session", "client3.database"), "the session 'client3.database' is not a directory",
-        ("DatabaseSetCurrent", "Take", "../../plain"), "'..' cannot name a session: it climbs out of its directory",
         ("DatabaseSetCurrent", "Take", "Session 1/../.."), "'../..' cannot name a take: it holds a '/', '\\' or ':'",
-        ("DatabaseSetCurrent", "Take", str(work)), "'' cannot name a session: it is empty",
         ("DatabaseSetCurrent", "Clip", "x"), "'Clip' is not one of Database, Session, Take",
         ("DatabaseGetCurrent", "Subject"), "'Subject' is not one of Database, Session, Take",
     ]
