@@ -121,6 +121,24 @@ def test_windows_answers_as_this_system(windows_host, host, clients, code, opera
     assert windows == answer(clients(host), operation, args)
 
 
+@pytest.fixture(scope="session")
+def windows_client(windows_exe):
+    """windows_client.cpp built against the client library built for Windows."""
+    program = BUILD / "windows_client.exe"
+    run([COMPILER, "-std=c++20", "-Wall", "-Wextra", "-Werror", f"-I{ROOT / 'include'}", Path(__file__).with_name("windows_client.cpp"),
+         BUILD / "libPelluxPostSDKClientCPP.a", BUILD / "libclient3_platform.a", "-lws2_32", "-static", "-o", program],
+        BUILD / "build.log", 300)
+    return program
+
+
+def test_the_windows_library_sends_a_request_larger_than_a_socket_buffer(windows_client, wine_env, host):
+    """25 MB go out whole only if the library's connection blocks as it sends; the application
+    answers the request it read."""
+    done = subprocess.run([wine_loader(), windows_client, host.address, str(host.port)], env=wine_env,
+                          capture_output=True, text=True, timeout=180)
+    assert done.stdout == "1003 a trajectory needs 1000 frames in X, Y, Z and E (given 1000000, 1000000, 1000000, 1000000)\n"
+
+
 # ---- Files, the end of a client, and the application's stop ----------------------------------------
 
 
