@@ -218,7 +218,7 @@ def test_a_worker_process_that_ends_loses_no_take(engine, takes, serial, tmp_pat
     if "workers" in engine:
         assert results[bad].value == "the worker process ended during the take"
         assert results[bad].attempts == retries + 1
-        # The applications of the workers that ended went with them.
+        # The applications of every worker, those that ended too, end with the batch.
         assert psutil.wait_procs(batchjobs.marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
     else:  # Dask gives up on the take itself, after its own number of tries
         assert results[bad].value.startswith("KilledWorker: ")
@@ -268,13 +268,6 @@ def test_an_interrupted_batch_resumes_where_it_stopped(engine, takes, serial, tm
     assert sorted(line["take"] for line in written) == sorted(takes)
     assert all(line["ok"] and line["value"] == serial[line["take"]] for line in written)
     assert list(batch.run(batchjobs.fix, takes, out=out, resume=True, **engine)) == []
-
-
-def test_the_pools_applications_end_with_the_batch(takes, monkeypatch):
-    marker = uuid.uuid4().hex
-    monkeypatch.setenv(batchjobs.MARKER, marker)
-    assert len(list(batch.run(batchjobs.fix, takes, workers=2))) == TAKES
-    assert psutil.wait_procs(batchjobs.marked_processes(marker, "client3-host"), timeout=WAIT)[1] == []
 
 
 # --- the command line -------------------------------------------------------------------------------
@@ -346,32 +339,23 @@ def test_ctrl_c_stops_workers_and_applications_and_the_batch_resumes(takes, tmp_
 # --- on a deployed cluster -----------------------------------------------------------------------
 
 
-def run_batch(user, takes, cluster, how, env=None):
-    """Runs the batch as the user would: the command line from the user's folder (as `python -m` finds
-    modules there), the script from another; its exit status, results and errors."""
-    if how == "command line":
-        command, cwd = [sys.executable, "-m", "Client3.batch", "steps:fix", *takes, "--cluster", cluster.address,
-                        "--out", str(user / "out.jsonl")], str(user)
-    else:
-        command, cwd = [sys.executable, str(user / "script.py"), cluster.address, *takes], str(user.parent)
-    done = subprocess.run(command, cwd=cwd, env=env or environment(cluster.marker), capture_output=True, text=True,
-                          timeout=WAIT * 2)
-    if how == "command line":
-        results = [(line["take"], line["ok"], line["value"]) for line in lines(user / "out.jsonl")]
-    else:
-        results = [tuple(json.loads(line)) for line in done.stdout.splitlines()]
+def run_script(user, takes, cluster):
+    """Runs the user's script from another folder; its exit status, results and errors."""
+    done = subprocess.run([sys.executable, str(user / "script.py"), cluster.address, *takes], cwd=str(user.parent),
+                          env=environment(cluster.marker), capture_output=True, text=True, timeout=WAIT * 2)
+    results = [json.loads(line) for line in done.stdout.splitlines()]
     return done.returncode, {take: (ok, value) for take, ok, value in results}, done.stderr
 
 
-@pytest.mark.parametrize("how", ["script", "command line"])
-def test_a_job_from_the_users_folder_runs_on_workers_that_lack_it(user, takes, serial, cluster, how):
-    status, results, errors = run_batch(user, takes, cluster, how)
+def test_a_job_from_the_users_script_runs_on_workers_that_lack_its_folder(user, takes, serial, cluster):
+    status, results, errors = run_script(user, takes, cluster)
     assert status == 0, errors
     assert results == {take: (True, value) for take, value in serial.items()}
 
 
 def test_a_job_that_needs_a_module_the_workers_lack_stops_before_its_first_take(user, takes, cluster, tmp_path):
-    # The job's module imports one that only this machine has, on a path outside the user's folder.
+    # The job's module, from the user's folder, is sent to the workers; it imports one that only this
+    # machine has, on a path outside that folder.
     (tmp_path / "onlyhere.py").write_text("UNSEEN = 'unseen'\n")
     (user / "needy.py").write_text("import onlyhere\n\n\ndef fix(client, take):\n    return onlyhere.UNSEEN\n")
     env = environment(cluster.marker, PYTHONPATH=str(tmp_path))
@@ -392,11 +376,11 @@ def test_a_scheduler_without_client3_stops_the_batch_before_its_first_take(user,
     (tmp_path / "shadow" / "Client3" / "__init__.py").write_text("raise ImportError('not installed here')\n")
     lone = Deployed(str(tmp_path), workers=0, pythonpath=str(tmp_path / "shadow"))
     try:
-        status, results, errors = run_batch(user, takes, lone, "command line")
+        status, results, errors = run_script(user, takes, lone)
     finally:
         assert lone.stop() == []
     assert (status, results) == (1, {})
-    assert errors.endswith(f"the Dask cluster at {lone.address} cannot run the job steps:fix: the "
+    assert errors.endswith(f"ClusterError: the Dask cluster at {lone.address} cannot run the job __main__:in_script: the "
                            "scheduler cannot load Client3's batch tasks (ImportError: not installed here)\n"), errors
 
 

@@ -100,21 +100,6 @@ def test_vector_follows_a_list(name):
     assert vector != model + model[:1]
 
 
-@pytest.mark.parametrize("name", sorted(Client3.VECTORS))
-def test_vector_errors_are_the_modules(name):
-    vector = Client3.classes[name]()
-    with pytest.raises(IndexError):
-        vector.pop()
-    with pytest.raises(IndexError):
-        vector[0]
-
-
-def test_vector_iteration_uses_the_modules_iterator():
-    iterator = iter(Client3.vectori([1, 2]))
-    assert isinstance(iterator, Client3.SwigPyIterator)
-    assert list(iterator) == [1, 2]
-
-
 @pytest.mark.parametrize("length, text", [
     (3, "vectori([0, 1, 2])"),
     (31, "vectori([" + ", ".join(map(str, range(30))) + ", ... (31 elements)])"),
