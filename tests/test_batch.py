@@ -137,7 +137,7 @@ def user(tmp_path_factory):
 
 @pytest.fixture(scope="module")
 def takes(user):
-    return batchjobs.make_takes(str(user), TAKES, FRAMES, last_as_csv=True)
+    return batchjobs.make_takes(str(user), TAKES, FRAMES)
 
 
 @pytest.fixture(scope="module")
