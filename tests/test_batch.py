@@ -172,17 +172,25 @@ def by_take(results):
     return found
 
 
-def test_results_equal_the_job_run_serially_and_a_failing_job_fails_its_own_take(engine, takes, serial, tmp_path):
-    """Each take once, however often listed; the job's exception is its take's result, the batch goes on."""
-    bad = str(tmp_path / "bad.scene")
-    shutil.copy(takes[0], bad)
-    results = by_take(batch.run(batchjobs.fail_marked, [takes[0], bad, *takes, takes[0]], **engine))
-    failed = results.pop(bad)
-    assert (failed.ok, failed.value) == (False, "ValueError: refusing bad.scene")
-    assert {take: result.value for take, result in results.items()} == serial
-    assert all(result.ok and result.attempts == 1 for result in results.values())
-    assert len({result.worker for result in results.values()}) <= 2
-    assert all(result.worker and result.seconds > 0 for result in results.values())
+def test_results_equal_the_job_run_serially_and_failures_stay_with_their_take(engine, takes, serial, tmp_path):
+    """Each take once, however often listed. A take the job refuses, or that the application cannot
+    open (a scene file is loaded, a C3D file imported), fails with its reason; the batch goes on."""
+    shutil.copy(takes[0], tmp_path / "bad.scene")
+    (tmp_path / "damaged.c3d").write_bytes(b"\x02\x50" + bytes(100))
+    failing = {
+        str(tmp_path / "bad.scene"): "ValueError: refusing bad.scene",
+        str(tmp_path / "missing.scene"): f"cannot read the file '{tmp_path / 'missing.scene'}' (result code 1003)",
+        str(tmp_path / "damaged.c3d"): "the C3D file is damaged: it does not start with a C3D header (result code 1003)",
+    }
+    results = by_take(batch.run(batchjobs.fail_marked, [takes[0], *failing, *takes, takes[0]], **engine))
+    assert {take: (results[take].ok, results[take].value) for take in failing} == {
+        take: (False, reason) for take, reason in failing.items()}
+    done = [results[take] for take in takes]
+    assert {result.take: result.value for result in done} == serial
+    assert all(result.ok and result.attempts == 1 for result in done)
+    assert len({result.worker for result in done}) <= 2
+    assert all(result.worker and result.seconds > 0 for result in done)
+    assert len(results) == len(failing) + len(takes)
 
 
 # The retries are counted where both engines run a take: Dask's is checked only for being passed on.
@@ -228,20 +236,6 @@ def test_an_application_that_does_not_start_fails_every_take(takes):
     results = by_take(batch.run(batchjobs.fix, takes[:2], host_options=["--frames", "0"], workers=2))
     assert [result.value for result in results.values()] == ["cannot start the application: "
                                                              "the application did not start: ''"] * 2
-
-
-# A scene file is loaded, a C3D file imported (the CSV take of `takes` is imported too).
-@pytest.mark.parametrize("name, content, message", [
-    ("missing.scene", None, "cannot read the file '{path}' (result code 1003)"),
-    ("damaged.c3d", b"\x02\x50" + bytes(100), "the C3D file is damaged: it does not start with a C3D header (result code 1003)"),
-])
-def test_a_take_that_cannot_be_opened_fails_with_the_applications_message(takes, serial, tmp_path, name, content, message):
-    path = tmp_path / name
-    if content is not None:
-        path.write_bytes(content)
-    results = by_take(batch.run(batchjobs.fix, [str(path), takes[0]], workers=2))
-    assert (results[str(path)].ok, results[str(path)].value) == (False, message.format(path=path))
-    assert results[takes[0]].value == serial[takes[0]]
 
 
 def lines(path):
