@@ -305,8 +305,8 @@ def test_ctrl_c_stops_workers_and_applications_and_the_batch_resumes(takes, tmp_
     out = tmp_path / "out.jsonl"
     three = takes[:3]  # two workers: once two takes are done, one runs the third and the other waits
     arguments = [sys.executable, "-m", "Client3.batch", "batchjobs:slow", *three, "--workers", "2", "--out", str(out)]
-    environment = dict(os.environ, **{batchjobs.MARKER: marker})
-    process = subprocess.Popen(arguments, cwd=HERE, env=environment, stdout=subprocess.PIPE, stderr=subprocess.PIPE,
+    env = dict(os.environ, **{batchjobs.MARKER: marker})
+    process = subprocess.Popen(arguments, cwd=HERE, env=env, stdout=subprocess.PIPE, stderr=subprocess.PIPE,
                                text=True, start_new_session=True)
     try:
         deadline = time.monotonic() + WAIT
