@@ -52,9 +52,9 @@ def slow(client, take):
     return fix(client, take)
 
 
-def make_takes(folder, count, frames, last_as_csv=False):
+def make_takes(folder, count, frames):
     """`count` demo takes of `frames` frames saved in `folder`, the i-th with a gap of 5 + 3i frames cut
-    into Alice's LANK (the last one exported as CSV when asked); their paths."""
+    into Alice's LANK, the last one exported as CSV; their paths."""
     import Client3
     from Client3.testing import running_host
 
@@ -70,9 +70,8 @@ def make_takes(folder, count, frames, last_as_csv=False):
             client.SetTrajectory("Alice", "LANK", trajectory.X, trajectory.Y, trajectory.Z, seen).check()
             paths.append(os.path.join(folder, f"take{index}.scene"))
             client.SaveFile(paths[-1], "").check()
-        if last_as_csv:
-            paths[-1] = paths[-1].replace(".scene", ".csv")
-            client.ExportFile(paths[-1], "").check()
+        paths[-1] = paths[-1].replace(".scene", ".csv")
+        client.ExportFile(paths[-1], "").check()
     return paths
 
 

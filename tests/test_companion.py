@@ -36,39 +36,6 @@ def client(host):
 def test_every_registered_type_has_a_class():
     registered = {name[: -len("_swigregister")] for name in vars(_Client3) if name.endswith("_swigregister")}
     assert set(Client3.classes) == registered
-    assert len(registered) == 46
-
-
-@pytest.mark.parametrize("name", sorted(Client3.TABLE))
-def test_class_members_are_the_module_functions(name):
-    cls = Client3.classes[name]
-    members = Client3.TABLE[name]
-    for method in members.methods:
-        assert callable(getattr(cls, method))
-    for field in members.fields:
-        assert isinstance(getattr(cls, field), property)
-    assert (getattr(cls, "__swig_destroy__", None) is getattr(_Client3, "delete_" + name, None)) == members.destructible
-
-
-def test_records_derive_from_output_result():
-    records = [cls for name, cls in Client3.classes.items() if name.startswith("Output_")]
-    assert len(records) == 36
-    assert all(issubclass(cls, Client3.Output_Result) for cls in records)
-
-
-def test_registration_happens_once_at_import():
-    code = (
-        "import _Client3, collections\n"
-        "calls = collections.Counter()\n"
-        "for name in [n for n in vars(_Client3) if n.endswith('_swigregister')]:\n"
-        "    original = getattr(_Client3, name)\n"
-        "    setattr(_Client3, name, lambda cls, o=original, n=name: (calls.update([n]), o(cls))[1])\n"
-        "import Client3, importlib\n"
-        "print(len(calls), max(calls.values()))\n"
-    )
-    status, out, err = run_python(code)
-    assert status == 0, err
-    assert out.split() == ["46", "1"]
 
 
 def test_constructed_objects_are_instances_and_are_destroyed_without_a_leak():
@@ -133,21 +100,6 @@ def test_vector_follows_a_list(name):
     assert vector != model + model[:1]
 
 
-@pytest.mark.parametrize("name", sorted(Client3.VECTORS))
-def test_vector_errors_are_the_modules(name):
-    vector = Client3.classes[name]()
-    with pytest.raises(IndexError):
-        vector.pop()
-    with pytest.raises(IndexError):
-        vector[0]
-
-
-def test_vector_iteration_uses_the_modules_iterator():
-    iterator = iter(Client3.vectori([1, 2]))
-    assert isinstance(iterator, Client3.SwigPyIterator)
-    assert list(iterator) == [1, 2]
-
-
 @pytest.mark.parametrize("length, text", [
     (3, "vectori([0, 1, 2])"),
     (31, "vectori([" + ", ".join(map(str, range(30))) + ", ... (31 elements)])"),
@@ -175,19 +127,6 @@ def test_record_fields_are_properties_that_get_and_set():
     assert repr(parameter) == "Type_Parameter(Name='Subject', Value='')"
 
 
-def test_record_fields_of_every_record_are_read(client):
-    records = [
-        client.GetSceneName(), client.GetSubjectNames(), client.GetMarkerNames("Alice"),
-        client.GetTrajectory("Alice", "LANK"), client.GetTrajectoryAtFrame("Alice", "LANK", 1),
-        client.GetBoneDetails("Alice", "", "Pelvis"), client.GetConstraintDetails("Alice", "", "LANK_LeftFoot"),
-        client.GetSubjectParamDetails("Alice", "", "Mass"), client.GetCommandInfo("Log"),
-    ]
-    for record in records:
-        shown = repr(record)
-        for field in record._fields:
-            assert f"{field}=" in shown
-
-
 def test_a_field_keeps_its_record_alive(client):
     x = client.GetTrajectory("Alice", "LANK").X
     gc.collect()
@@ -208,18 +147,12 @@ with Client3.connect({host.address!r}, {host.port}) as client:
     assert (code, out) == (0, "1003 no subject named ''\n"), err
 
 
-def test_client_disconnects_at_the_end_of_with(host):
-    with Client3.connect(host.address, host.port) as client:
-        assert client.IsConnected()
-    assert not client.IsConnected()
-
-
-@pytest.mark.parametrize("scene, frames, subjects", [("demo", 50, ["Alice", "Bob"]), ("empty", 20, [])])
-def test_running_host_serves_the_scene_asked_for(scene, frames, subjects):
-    with running_host(scene=scene, frames=frames, log=False) as host:
+def test_running_host_serves_the_scene_asked_for_and_the_client_disconnects_after_with():
+    with running_host(scene="empty", frames=20, log=False) as host:
         with Client3.connect(host.address, host.port) as client:
-            assert client.GetFrameCount() == frames
-            assert client.GetSubjectNames().check().Names == subjects
+            assert client.GetFrameCount() == 20
+            assert client.GetSubjectNames().check().Names == []
+        assert not client.IsConnected()
     assert host.process.poll() is not None
 
 

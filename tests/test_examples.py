@@ -29,16 +29,6 @@ def test_session_prints_the_account_and_writes_the_plot(tmp_path):
         assert plot.read(8) == b"\x89PNG\r\n\x1a\n"
 
 
-def test_session_writes_its_picture_where_asked(tmp_path):
-    out = tmp_path / "plots" / "bob.png"
-    out.parent.mkdir()
-    done = run(os.path.join(ROOT, "examples", "session.py"), "--out", str(out), "--subject", "Bob", "--marker", "LKNE",
-               cwd=tmp_path)
-    assert done.returncode == 0, done.stderr
-    assert f"plot of Bob's LKNE written to {out}" in done.stdout.splitlines()
-    assert out.read_bytes()[:8] == b"\x89PNG\r\n\x1a\n" and not (tmp_path / "session.png").exists()
-
-
 def test_session_reports_an_unknown_marker(tmp_path):
     done = run(os.path.join(ROOT, "examples", "session.py"), "--marker", "XYZ", "--out", "x.png", cwd=tmp_path)
     assert done.returncode != 0
