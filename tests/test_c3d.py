@@ -114,8 +114,6 @@ def test_exported_take_is_read_back_by_the_independent_reader(app, name, tmp_pat
 
 
 def test_repeated_labels_and_a_short_frame_count_are_logged(app, host):
-    names = point_names(seen_in("sample_00_Motion_Analysis_Corporation_Walk1.c3d").labels)
-    assert names[25] == ("Unlabeled", "RKNE_2") and names[41:43] == [("Unlabeled", "VMID_2"), ("Unlabeled", "VMID_3")]
     import_take(app, CORPUS / "sample_00_Motion_Analysis_Corporation_Walk1.c3d")
     import_take(app, CORPUS / "sample_13_Dance.c3d")
     log = host.log()
