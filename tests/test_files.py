@@ -92,7 +92,7 @@ def test_saving_replaces_the_file_and_leaves_nothing_else(app, tmp_path):
     assert [p.name for p in path.parent.iterdir()] == ["scene.c3scene"]
 
 
-def test_failed_save_keeps_the_old_file(app, tmp_path):
+def test_a_save_into_a_missing_directory_is_refused(app, tmp_path):
     missing = tmp_path / "no such directory" / "scene.c3scene"
     assert app.result("SaveFile", str(missing), "") == (m.ApplicationError, f"cannot write the file '{missing}'")
     assert app.GetSceneName() == ("Demo", "")
