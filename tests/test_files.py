@@ -92,9 +92,11 @@ def test_saving_replaces_the_file_and_leaves_nothing_else(app, tmp_path):
     assert [p.name for p in path.parent.iterdir()] == ["scene.c3scene"]
 
 
-def test_a_save_into_a_missing_directory_is_refused(app, tmp_path):
+def test_refused_saves_name_their_reason_and_keep_the_scene(app, tmp_path):
     missing = tmp_path / "no such directory" / "scene.c3scene"
     assert app.result("SaveFile", str(missing), "") == (m.ApplicationError, f"cannot write the file '{missing}'")
+    assert app.result("SaveFile", str(tmp_path / "s"), "Compress=yes") == (
+        m.ApplicationError, "'SaveFile' takes no options: 'Compress=yes'")
     assert app.GetSceneName() == ("Demo", "")
 
 
