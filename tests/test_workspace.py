@@ -68,7 +68,6 @@ def test_a_new_database_is_a_directory_layout_and_becomes_current(app, tmp_path)
     assert sorted(os.listdir(database)) == ["Session 1", "client3.database"]
     assert (database / "client3.database").read_text() == "client3-database 1\n"
     assert current(app) == (str(database), "Session 1", "")
-    assert app.DatabaseGetMarkedTakes() == []
 
 
 def test_current_session_and_take_and_the_marked_takes(app, tmp_path):
