@@ -86,18 +86,6 @@ def test_longer_gaps_than_the_transition_time_stay_and_the_rest_are_untouched(ap
     assert trajectory(app, "Alice", "LFHD")[1].all()
 
 
-def test_without_apply_fixed_markers_the_values_are_written_and_the_frames_stay_unseen(app):
-    set_occlusion(app, "ApplyFixedMarkers", False)
-    truth = cut(app, "Bob", "RFHD", 500, 30)
-    zeroed = truth.copy()
-    zeroed[:, 500:530] = 0
-    app.SetTrajectory("Bob", "RFHD", *[list(v) for v in zeroed], [not 500 <= f < 530 for f in range(1000)])
-    app.OfflineFixOcclusion("Bob", "")
-    after, seen = trajectory(app, "Bob", "RFHD")
-    assert not seen[500:530].any()
-    assert np.abs(after - truth)[:, 500:530].max() < RIGID
-
-
 def test_a_fix_while_occlusion_fixing_is_off_is_refused_and_changes_nothing(app, tmp_path):
     set_occlusion(app, "Enabled", False)
     before = app.scene_file(tmp_path / "scene")
@@ -174,14 +162,21 @@ def fix_summary(app, subject, longest=50):
             f"interpolation), {longer + ends} left ({longer} longer than {count(longest, 'frame')}, {ends} at an end of the take)")
 
 
-def test_occlusion_fixing_says_for_each_subject_what_it_filled_and_left(app):
+def test_occlusion_fixing_says_what_it_filled_and_left_and_without_apply_fixed_markers_leaves_fills_unseen(app):
     cut(app, "Bob", "RKNE", 0, 3)  # a gap at the take's start stays
     expected = "; ".join(fix_summary(app, subject) for subject in ("Alice", "Bob"))
     assert app.result("OfflineFixOcclusion", "", "") == (m.Success, expected)
     set_occlusion(app, "ApplyFixedMarkers", False)
-    cut(app, "Alice", "C7", 100, 10)
-    assert app.result("OfflineFixOcclusion", "Alice", "") == (
-        m.Success, fix_summary(app, "Alice") + "; the filled frames stay unseen (ApplyFixedMarkers is off)")
+    truth, seen = trajectory(app, "Bob", "RFHD")
+    seen[500:530] = False
+    zeroed = truth.copy()
+    zeroed[:, 500:530] = 0  # the fill is written over these all the same
+    app.SetTrajectory("Bob", "RFHD", *[list(v) for v in zeroed], [bool(v) for v in seen])
+    assert app.result("OfflineFixOcclusion", "Bob", "") == (
+        m.Success, fix_summary(app, "Bob") + "; the filled frames stay unseen (ApplyFixedMarkers is off)")
+    after, still_seen = trajectory(app, "Bob", "RFHD")
+    assert not still_seen[500:530].any()
+    assert np.abs(after - truth)[:, 500:530].max() < RIGID
 
 
 def placed_frames(app, subject):
