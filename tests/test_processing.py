@@ -39,13 +39,6 @@ def distance(a, b):
     return np.sqrt(((a - b) ** 2).sum(axis=0))
 
 
-def test_a_gap_as_long_as_the_transition_time_is_filled_from_a_marker_of_the_same_segment(app):
-    truth = cut(app, "Alice", "LASI", 300, 50)  # RASI is on the pelvis too; 50 frames is the longest gap the defaults fill
-    app.OfflineFixOcclusion("Alice", "")
-    filled, seen = trajectory(app, "Alice", "LASI")
-    assert seen[300:350].all()
-    assert distance(filled, truth)[300:350].max() < RIGID
-
 def first_slope(x):
     """The slope at the first of three frames, from all three (a second-order one-sided difference)."""
     return np.gradient(x, edge_order=2)[0]
@@ -75,12 +68,16 @@ def test_a_cubic_fill_is_the_hermite_cubic_of_the_slopes_beside_the_gap(app, hid
         assert filled[axis, 300:320] == pytest.approx(cubic(np.arange(300, 320)), abs=1e-9)
 
 
-def test_longer_gaps_than_the_transition_time_stay_and_the_rest_are_untouched(app):
-    truth = cut(app, "Alice", "LFHD", 300, 51)
+def test_gaps_up_to_the_transition_time_are_filled_and_longer_ones_stay_untouched(app):
+    rigid = cut(app, "Alice", "LASI", 300, 50)  # RASI is on the pelvis too; 50 frames: the defaults' 0.5 s
+    longer = cut(app, "Alice", "LFHD", 300, 51)
     app.OfflineFixOcclusion("Alice", "")
-    after, seen = trajectory(app, "Alice", "LFHD")
+    filled, seen = trajectory(app, "Alice", "LASI")
+    assert seen[300:350].all()
+    assert distance(filled, rigid)[300:350].max() < RIGID
+    left, seen = trajectory(app, "Alice", "LFHD")
     assert not seen[300:351].any()
-    assert (after == truth).all()
+    assert (left == longer).all()
     set_occlusion(app, "TransitionTime", 0.51)
     app.OfflineFixOcclusion("Alice", "")
     assert trajectory(app, "Alice", "LFHD")[1].all()
