@@ -61,18 +61,13 @@ def current(app):
     return tuple(app.DatabaseGetCurrent(item) for item in ("Database", "Session", "Take"))
 
 
-def test_a_new_database_is_a_directory_layout_and_becomes_current(app, tmp_path):
+def test_a_new_database_becomes_current_and_its_sessions_takes_and_marks_are_read_from_disk(app, tmp_path):
     assert current(app) == ("", "", "")
     app.DatabaseCreate(str(tmp_path), "Gait lab")
     database = tmp_path / "Gait lab"
     assert sorted(os.listdir(database)) == ["Session 1", "client3.database"]
     assert (database / "client3.database").read_text() == "client3-database 1\n"
     assert current(app) == (str(database), "Session 1", "")
-
-
-def test_current_session_and_take_and_the_marked_takes(app, tmp_path):
-    app.DatabaseCreate(str(tmp_path), "db")
-    database = tmp_path / "db"
     for take, marked in [("Session 1/Walk 1", True), ("Session 1/Walk 2", False), ("Day 2/Run", True), ("Day 2/Jump", True)]:
         (database / take).mkdir(parents=True)
         if marked:
