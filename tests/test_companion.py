@@ -43,6 +43,7 @@ def operations(values):
         ("insert past end", lambda s: s.insert(100, b)),
         ("pop last", lambda s: s.pop()),
         ("pop first", lambda s: s.pop(0)),
+        ("pop inside", lambda s: s.pop(1)),
         ("reverse", lambda s: s.reverse()),
     ]
 
