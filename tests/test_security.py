@@ -45,7 +45,6 @@ def receive_all(sock):
 @pytest.mark.parametrize("host_from_env, options, client_env, accepted", [
     (False, "token=", None, False),
     (False, "token=correct hors", None, False),
-    (False, "token=correct hors", None, False),
     (False, "token=correct horse!", None, False),
     (False, "timeout=2000&token=correct horse&connect=2000", None, True),
     (False, "", TOKEN, True),                         # the client's token from its environment
@@ -108,13 +107,17 @@ def stopped(process):
     return process.returncode, err.decode()
 
 
-@pytest.mark.parametrize("where", ["0.0.0.0", "::", "127.1", "127.a.b.c", "example.invalid"])
-def test_listening_beyond_loopback_needs_a_token(where):
-    process, line = run_host("--host", where)
+@pytest.mark.parametrize("options, problem", [
+    *[(("--host", where), f"listening on {where} needs an access token: give --token or CLIENT3_TOKEN")
+      for where in ["0.0.0.0", "::", "127.1", "127.a.b.c"]],
+    (("--files", "/no/such/directory"), "--files: no directory at '/no/such/directory'"),
+])
+def test_options_it_refuses_to_start_with(options, problem):
+    process, line = run_host(*options)
     assert line == ""
     status, err = stopped(process)
     assert status == 2
-    assert err.startswith(f"client3-host: listening on {where} needs an access token: give --token or CLIENT3_TOKEN\n")
+    assert err.startswith(f"client3-host: {problem}\n")
 
 
 @pytest.mark.parametrize("where, options, token", [
@@ -157,7 +160,6 @@ def outside_contents(outside):
 
 
 ALLOWED = [
-    ("SaveFile", ("{a}/scene", "")),
     ("SaveFile", ("{a}/sub/../scene", "")),
     ("SaveFile", ("{a}/sub/scene", "")),
     ("ExportFile", ("{a}/take.csv", "csv")),
@@ -209,14 +211,6 @@ def test_file_commands_outside_the_named_directories_are_refused(start_host, cli
     assert app.DatabaseGetCurrent("Database") == ""
 
 
-def test_files_option_names_an_existing_directory(tmp_path):
-    process, line = run_host("--files", str(tmp_path / "missing"))
-    assert line == ""
-    status, err = stopped(process)
-    assert status == 2
-    assert err.startswith(f"client3-host: --files: no directory at '{tmp_path / 'missing'}'\n")
-
-
 # ---- Limits ---------------------------------------------------------------------------------------------
 
 
@@ -248,8 +242,7 @@ def test_a_fast_client_is_slowed_and_loses_nothing(start_host, clients):
 
 @pytest.mark.parametrize("sent, logged", [
     ("back\roverwritten", "back\\roverwritten"),
-    ("escape \x1b[2J and bell \x07", "escape ?[2J and bell ?"),
-    ("tab\tand delete\x7f", "tab?and delete?"),
+    ("escape \x1b[2J and delete\x7f", "escape ?[2J and delete?"),
 ])
 def test_client_text_cannot_forge_log_lines(start_host, clients, sent, logged):
     host = start_host()
