@@ -16,9 +16,8 @@ import pytest
 
 import _Client3 as m
 import repeat
-from hostproc import (MAX_FRAME, NOT_CONNECTED, Client, commands, frame, hello, int_value, parameters,
-                      plain, raw_connection, read_frame, refusal, reply, request, shake_hands, text_value, unread_bytes,
-                      wait_until)
+from hostproc import (MAX_FRAME, NOT_CONNECTED, Client, commands, frame, hello, int_value, parameters, plain,
+                      raw_connection, read_frame, refusal, reply, request, text_value, wait_until)
 
 COMMANDS = commands()
 FRAMES = 1000
@@ -40,6 +39,18 @@ REFUSED = "Host application encountered an error processing the request."
 CONVERSION = "Unable to convert output parameter to a numeric value."
 ONE_FRAME = "Invalid number of frames returned, expected one frame."
 ON_LINUX = pytest.mark.skipif(not os.path.exists("/proc/net/tcp"), reason="reads the connections from /proc/net/tcp")
+
+
+def unread_bytes(port):
+    """The bytes that wait unread in this machine's connections to `port` (Linux's /proc/net/tcp)."""
+    with open("/proc/net/tcp") as table:
+        rows = [line.split() for line in table.readlines()[1:]]
+    return sum(int(row[4].split(":")[1], 16) for row in rows if int(row[2].split(":")[1], 16) == port)
+
+
+def shake_hands(sock):
+    sock.sendall(hello())
+    assert read_frame(sock) == b"H" + struct.pack("<HH", 1, len(COMMANDS))
 
 
 @pytest.fixture

@@ -21,8 +21,8 @@ import pytest
 import companion
 import hostproc
 from conftest import needs_plain_allocator
-from hostproc import (MAX_FRAME, Client, commands, close_with_reset, frame, hello, int_value, read_frame, refusal, reply,
-                      request, text_value, wait_until)
+from hostproc import (MAX_FRAME, Client, commands, frame, hello, int_value, read_frame, refusal, reply, request,
+                      text_value, wait_until)
 
 SEED = 20261123
 ROUNDS = 1000
@@ -33,6 +33,12 @@ HELD_BYTES = 256 << 10
 BURST = 30        # connections opened and dropped at once
 CLIENTS = 64      # the host's default limit
 FRAMES = 1000     # the demo take's
+
+
+def close_with_reset(sock):
+    """Closes `sock` so that its end resets the connection rather than ending it."""
+    sock.setsockopt(socket.SOL_SOCKET, socket.SO_LINGER, struct.pack("ii", 1, 0))
+    sock.close()
 
 
 def host_status(host):
