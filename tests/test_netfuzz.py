@@ -206,11 +206,10 @@ def fuzz(host, rounds, seconds, seed):
         for dripper in drippers:
             dripper.drip()
         if turn % 20 == 0:
-            # The well-behaved client is served, and sees its own writes.
+            # The well-behaved client is served (a refusal fails the test); its writes are read back at the end.
             at = (turn // 20 - 1) % FRAMES + 1
             written[at] = float(turn)
             well.SetTrajectoryAtFrame("Bob", "RANK", at, float(turn), 0.0, 0.0, True)
-            assert well.GetTrajectoryAtFrame("Bob", "RANK", at) == (float(turn), 0.0, 0.0, True)
             rss, threads = host_status(host)
             rss_most, threads_most = max(rss_most, rss), max(threads_most, threads)
 
@@ -219,7 +218,6 @@ def fuzz(host, rounds, seconds, seed):
     for sock in [dripper.sock for dripper in drippers] + holders:
         sock.close()
 
-    assert fuzzer.connections > 2 * rounds
     # A thread for each client, at most CLIENTS of them, besides the main thread; none left once they
     # are gone.
     assert threads_most <= CLIENTS + 1
