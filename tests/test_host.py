@@ -350,7 +350,7 @@ def test_fault_gives_its_result_code(start_host, clients, fault, operation, args
 
 @ON_LINUX
 def test_timed_out_request_and_its_late_reply(start_host, clients):
-    host = start_host("--fault", "delay=600@GetSceneName", "--fault", "delay=600@GetFrameCount")
+    host = start_host("--fault", "delay=600@GetSceneName")
     client = clients(host, "timeout=300")
     started = time.monotonic()
     assert client.result("GetSceneName") == (m.RequestTimedOut, TIMED_OUT)
@@ -359,9 +359,6 @@ def test_timed_out_request_and_its_late_reply(start_host, clients):
     # Once the late reply has come, the next request must get its own reply and never that one.
     assert wait_until(lambda: unread_bytes(host.port) > 0)
     assert client.GetSubjectNames()[1] == ["Walker", "Walker"]
-    assert client.GetFrameCount() == 0
-    assert wait_until(lambda: unread_bytes(host.port) > 0)
-    assert client.GetMarkerNames("Alice") == MARKERS
 
 
 @pytest.mark.skipif(not os.path.exists("/proc/self/statm"), reason="resident memory is read from /proc")
