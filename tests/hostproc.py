@@ -135,8 +135,9 @@ def collect(ended_only=False):
 
 
 def start(*options, log_path, timeout=10, command=None, env=None):
-    """Starts the application with `options` on a port the system picks; returns its Host. `command`
-    runs another build of it (the Windows one under Wine), with the environment `env`."""
+    """Starts the application with `options` (which may name another --host) on a port the system picks;
+    returns its Host, or raises RuntimeError with its exit status and log when it does not start.
+    `command` runs another build of it (the Windows one under Wine), with the environment `env`."""
     collect(ended_only=True)
     command = command or [executable()]
     if not command[0]:
@@ -145,12 +146,11 @@ def start(*options, log_path, timeout=10, command=None, env=None):
         process = subprocess.Popen([*command, "--host", ADDRESS, "--port", "0", *options], env=env,
                                    stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=log)
     line = first_line(process.stdout, time.monotonic() + timeout)
-    prefix = f"listening on {ADDRESS}:"
-    if not line.startswith(prefix):
+    if not line.startswith("listening on "):
         host = Host(process, None, log_path)
-        host.stop(signal.SIGKILL)
-        raise RuntimeError(f"{NAME} {' '.join(options)} did not start: {line!r}; its log: {host.log()!r}")
-    return Host(process, int(line[len(prefix):]), log_path)
+        status = host.stop(signal.SIGKILL)
+        raise RuntimeError(f"{NAME} {' '.join(options)} did not start (exit status {status}): {line!r}; its log: {host.log()!r}")
+    return Host(process, int(line.rsplit(":", 1)[1]), log_path)
 
 
 # ---- Through the module -------------------------------------------------------------------------
