@@ -72,10 +72,7 @@ def peer(tmp_path_factory):
 def host(tmp_path_factory):
     """The demo application shared by the whole session, on a port of its own. Tests read from it;
     a test that changes the scene starts its own with `start_host`."""
-    try:
-        started = hostproc.start(log_path=tmp_path_factory.mktemp("host") / "host.log")
-    except RuntimeError as error:
-        pytest.fail(str(error))
+    started = hostproc.start(log_path=tmp_path_factory.mktemp("host") / "host.log")
     yield started
     started.stop()
 
@@ -94,10 +91,7 @@ def start_host(tmp_path):
     started = []
 
     def start(*options):
-        try:
-            started.append(hostproc.start(*options, log_path=tmp_path / f"host{len(started)}.log"))
-        except RuntimeError as error:
-            pytest.fail(str(error))
+        started.append(hostproc.start(*options, log_path=tmp_path / f"host{len(started)}.log"))
         return started[-1]
 
     yield start

@@ -113,9 +113,6 @@ class Host:
         self.process.stdout.close()
         return self.process.returncode
 
-    def kill(self):
-        return self.stop(signal.SIGKILL)
-
 
 # Hosts asked to stop whose end is collected later: an application that has served a client takes a
 # tenth of a second to stop, which a test need not wait for.
@@ -138,8 +135,9 @@ def collect(ended_only=False):
 
 
 def start(*options, log_path, timeout=10, command=None, env=None):
-    """Starts the application with `options` on a port the system picks; returns its Host. `command`
-    runs another build of it (the Windows one under Wine), with the environment `env`."""
+    """Starts the application with `options` (which may name another --host) on a port the system picks;
+    returns its Host, or raises RuntimeError with its exit status and log when it does not start.
+    `command` runs another build of it (the Windows one under Wine), with the environment `env`."""
     collect(ended_only=True)
     command = command or [executable()]
     if not command[0]:
@@ -148,30 +146,11 @@ def start(*options, log_path, timeout=10, command=None, env=None):
         process = subprocess.Popen([*command, "--host", ADDRESS, "--port", "0", *options], env=env,
                                    stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=log)
     line = first_line(process.stdout, time.monotonic() + timeout)
-    prefix = f"listening on {ADDRESS}:"
-    if not line.startswith(prefix):
+    if not line.startswith("listening on "):
         host = Host(process, None, log_path)
-        host.kill()
-        raise RuntimeError(f"{NAME} {' '.join(options)} did not start: {line!r}; its log: {host.log()!r}")
-    return Host(process, int(line[len(prefix):]), log_path)
-
-
-def _tcp_connections():
-    """This machine's TCP connections (Linux's /proc/net/tcp): (local port, remote port, state, bytes unread)."""
-    with open("/proc/net/tcp") as table:
-        rows = [line.split() for line in table.readlines()[1:]]
-    return [(int(row[1].split(":")[1], 16), int(row[2].split(":")[1], 16), row[3], int(row[4].split(":")[1], 16))
-            for row in rows]
-
-
-def unread_bytes(port):
-    """The bytes that wait unread in this machine's connections to `port` (Linux only)."""
-    return sum(unread for _, remote, _, unread in _tcp_connections() if remote == port)
-
-
-def connections_of(port):
-    """The connections that `port` of this machine holds, listening aside (Linux only)."""
-    return sum(1 for local, _, state, _ in _tcp_connections() if local == port and state != "0A")
+        status = host.stop(signal.SIGKILL)
+        raise RuntimeError(f"{NAME} {' '.join(options)} did not start (exit status {status}): {line!r}; its log: {host.log()!r}")
+    return Host(process, int(line.rsplit(":", 1)[1]), log_path)
 
 
 # ---- Through the module -------------------------------------------------------------------------
@@ -180,14 +159,6 @@ def connections_of(port):
 def address(host, options=""):
     """The host's address as Connect takes it, with its options."""
     return host.address + ("?" + options if options else "")
-
-
-class ApplicationError(AssertionError):
-    """An operation that the application refused: its result code and message."""
-
-    def __init__(self, code, text):
-        super().__init__(f"{code}: {text}")
-        self.code, self.text = code, text
 
 
 def parameters(vector):
@@ -216,8 +187,8 @@ def plain(value, kind=None):
 class Client:
     """A client of the library through the module's functions, connected to `host` when one is given.
     `client.Op(args)` runs Op and answers its record's outputs as plain values (one alone, several as a
-    tuple, in the order the command declares them), or its plain answer; a refusal raises
-    ApplicationError. `client.result("Op", args)` answers the code and message of Op's record, and
+    tuple, in the order the command declares them), or its plain answer; a refusal fails the test
+    with its code and message. `client.result("Op", args)` answers the code and message of Op's record, and
     `client.record("Op", args)` the record itself."""
 
     def __init__(self, host=None, options=""):
@@ -239,7 +210,7 @@ class Client:
             return record
         code = m.Output_Result_Result_get(record)
         if code != m.Success:
-            raise ApplicationError(code, m.SafeString_Value(m.Output_Result_ResultString_get(record)))
+            raise AssertionError(f"{operation}: {code}: {m.SafeString_Value(m.Output_Result_ResultString_get(record))}")
         outputs = [(name, type_) for name, type_ in commands().get(operation, ((), ()))[1] if hasattr(m, f"{kind}_{name}_get")]
         values = [plain(getattr(m, f"{kind}_{name}_get")(record), type_) for name, type_ in outputs]
         return values[0] if len(values) == 1 else tuple(values) if values else None
@@ -315,13 +286,3 @@ def refusal(payload):
 def raw_connection(host):
     return socket.create_connection((host.address, host.port), timeout=5)
 
-
-def shake_hands(sock):
-    sock.sendall(hello())
-    assert read_frame(sock) == b"H" + struct.pack("<HH", 1, len(commands()))
-
-
-def close_with_reset(sock):
-    """Closes `sock` so that its end resets the connection rather than ending it."""
-    sock.setsockopt(socket.SOL_SOCKET, socket.SO_LINGER, struct.pack("ii", 1, 0))
-    sock.close()

@@ -21,8 +21,8 @@ import pytest
 import companion
 import hostproc
 from conftest import needs_plain_allocator
-from hostproc import (MAX_FRAME, Client, commands, close_with_reset, frame, hello, int_value, read_frame, refusal, reply,
-                      request, text_value, wait_until)
+from hostproc import (MAX_FRAME, Client, commands, frame, hello, int_value, read_frame, refusal, reply, request,
+                      text_value, wait_until)
 
 SEED = 20261123
 ROUNDS = 1000
@@ -33,6 +33,12 @@ HELD_BYTES = 256 << 10
 BURST = 30        # connections opened and dropped at once
 CLIENTS = 64      # the host's default limit
 FRAMES = 1000     # the demo take's
+
+
+def close_with_reset(sock):
+    """Closes `sock` so that its end resets the connection rather than ending it."""
+    sock.setsockopt(socket.SOL_SOCKET, socket.SO_LINGER, struct.pack("ii", 1, 0))
+    sock.close()
 
 
 def host_status(host):
@@ -200,11 +206,10 @@ def fuzz(host, rounds, seconds, seed):
         for dripper in drippers:
             dripper.drip()
         if turn % 20 == 0:
-            # The well-behaved client is served, and sees its own writes.
+            # The well-behaved client is served (a refusal fails the test); its writes are read back at the end.
             at = (turn // 20 - 1) % FRAMES + 1
             written[at] = float(turn)
             well.SetTrajectoryAtFrame("Bob", "RANK", at, float(turn), 0.0, 0.0, True)
-            assert well.GetTrajectoryAtFrame("Bob", "RANK", at) == (float(turn), 0.0, 0.0, True)
             rss, threads = host_status(host)
             rss_most, threads_most = max(rss_most, rss), max(threads_most, threads)
 
@@ -213,7 +218,6 @@ def fuzz(host, rounds, seconds, seed):
     for sock in [dripper.sock for dripper in drippers] + holders:
         sock.close()
 
-    assert fuzzer.connections > 2 * rounds
     # A thread for each client, at most CLIENTS of them, besides the main thread; none left once they
     # are gone.
     assert threads_most <= CLIENTS + 1
