@@ -56,22 +56,6 @@ def test_a_view_shows_the_vectors_own_storage_both_ways(name, format, dtype, val
     assert view[1] == written
 
 
-def test_the_bridge_joins_the_ring_when_imported_before_the_module():
-    code = (
-        "import importlib.util, sys\n"
-        f"found = importlib.util.spec_from_file_location('Client3._buffers', {_buffers.__file__!r})\n"
-        "buffers = importlib.util.module_from_spec(found)\n"
-        "found.loader.exec_module(buffers)\n"
-        "assert '_Client3' not in sys.modules\n"
-        "import _Client3\n"
-        "vector = _Client3.new_vectord([0.5, 1.5])\n"
-        "print(buffers.view(vector).tolist())\n"
-    )
-    status, out, err = run_python(code)
-    assert status == 0, err
-    assert out.splitlines()[0] == "[0.5, 1.5]"
-
-
 def test_a_view_keeps_the_vector_alive():
     vector = Client3.vectord([float(i) for i in range(1000)])
     gone = weakref.ref(vector)
