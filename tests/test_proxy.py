@@ -162,7 +162,6 @@ REGISTER = "_Client3.SafeString_swigregister(type('S', (), {%s})); "
     (REGISTER % "" + "p = _Client3.new_SafeString(); del p", LEAK.format(SAFE_STRING_NAME)),
     # Registered with the delete function: destroyed, no line.
     (REGISTER % "'__swig_destroy__': _Client3.delete_SafeString" + "[_Client3.new_SafeString() for i in range(1000)]", ""),
-    ("p = peer.make('_p_int', 64, 3); del p", LEAK.format("LONG32 *")),
     ("p = peer.make(None, 64, 3); del p", LEAK.format("unknown")),
     # A proxy that acquired ownership later leaks like any other owner.
     ("p = peer.make('_p_char', 64, 2); p.acquire(); del p", LEAK.format("char *")),
