@@ -128,8 +128,7 @@ def test_calling_conventions_and_argument_counts(record):
 def test_arguments_are_checked(name, field, kind):
     for function, rest in ((f"{name}_{field}_set", (0,)), (f"{name}_{field}_get", ())):
         message = f"in method '{function}', argument 1 of type '{NS}{name} *'"
-        for stranger in (text("x"), 7):  # a proxy of another type, a plain object
-            raises(TypeError, message, fn(function), stranger, *rest)
+        raises(TypeError, message, fn(function), text("x"), *rest)  # a proxy of another type
     raises(ValueError, "invalid null reference " + message, fn(function), None)  # a getter cannot read a null record
     # Argument 2 of the setter: texts and vectors are references, None is a null one.
     setter, message = fn(f"{name}_{field}_set"), f"in method '{name}_{field}_set', argument 2 of type '{type_text(kind)}'"
