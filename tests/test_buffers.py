@@ -263,10 +263,9 @@ def test_a_buffer_in_the_network_byte_order_is_refused():
 
 
 @pytest.mark.parametrize("function", [_buffers.view, _buffers.copy, _buffers.exports, lambda v: _buffers.fill(v, b"")])
-@pytest.mark.parametrize("not_a_vector", [None, Client3.SafeString("x")])
-def test_the_bridge_refuses_what_is_not_a_vector(function, not_a_vector):
+def test_the_bridge_refuses_what_is_not_a_vector(function):
     with pytest.raises(TypeError, match="must be a"):
-        function(not_a_vector)
+        function(Client3.SafeString("x"))
 
 
 @pytest.mark.parametrize("name, values, dtype", [("vectorb", [True, False, True], np.bool_), ("vectorss", ["a", "é", ""], np.str_)])
