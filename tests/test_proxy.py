@@ -42,7 +42,7 @@ def test_repr_of_module_made_proxy_and_of_a_chain(peer):
     assert repr(first) == shown(first, SAFE_STRING_NAME) + shown(second, "LONG32 *") + shown(third, "char *")
 
 
-@pytest.mark.parametrize("loop", [1, 2, 3])
+@pytest.mark.parametrize("loop", [1, 2])
 def test_repr_of_a_chain_that_loops_shows_each_proxy_once(loop):
     proxies = [_Client3.new_SafeString() for _ in range(loop)]
     for proxy, following in zip(proxies, proxies[1:] + proxies[:1]):
