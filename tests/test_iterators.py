@@ -58,9 +58,8 @@ def test_in_place_operators_move_the_object_and_take_ownership():
     again = m.SwigPyIterator___isub__(result, 1)
     assert m.SwigPyIterator_value(again) == 20 and (again.this.own(), result.this.own()) == (True, False)
     closed = m.vectori_iterator(v)
-    for n, error in ((7, StopIteration), (2**31, OverflowError)):  # a failed move keeps the ownership
-        pytest.raises(error, m.SwigPyIterator___iadd__, closed, n)
-        assert closed.this.own() is True
+    pytest.raises(StopIteration, m.SwigPyIterator___iadd__, closed, 7)  # a failed move keeps the ownership
+    assert closed.this.own() is True
 
 
 @pytest.mark.parametrize("left, right", [("begin", "rbegin"), ("rend", "end"), ("iterator", "rbegin")])
