@@ -118,7 +118,6 @@ def test_size_changes_are_refused_while_a_view_is_exported(operation):
     with pytest.raises(BufferError, match="while 1 view of it is exported"):
         operation(vector, other)
     assert list(vector) == [1.0, 2.0, 3.0] and list(other) == [4.0]
-    assert view.tolist() == [1.0, 2.0, 3.0]
     view.release()
     operation(vector, other)
 
