@@ -82,7 +82,7 @@ def test_other_instances_proxy_is_not_read_as_a_sequence(inst):
 @by_instance
 def test_refused_sources_leave_only_the_overload_message(inst):
     """Objects that are no sequence, sequences that fail, and sequences with one refused element."""
-    for source in ({1, 2}, {0: 1}, (x for x in ()), 1.5, Sequence([1], fail_at=0), Hostile(TypeError),
+    for source in ({0: 1}, Sequence([1], fail_at=0), Hostile(TypeError),
                    [inst.samples[0], inst.wrong], (inst.wrong,), Sequence([inst.wrong, inst.samples[0]])):
         raises(TypeError, inst.new_refused, inst.new, source)
 
