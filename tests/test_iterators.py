@@ -131,7 +131,7 @@ def test_text_values_are_owned_copies():
 
 # Positions outside the vector, and elements released under an iterator, are never read: whatever the
 # documents leave undefined here is refused, and the closed iterator stops.
-@pytest.mark.parametrize("start, step", [("end", 0), ("end", 1000), ("rend", 1), ("begin", -3)])
+@pytest.mark.parametrize("start, step", [("end", 0), ("rend", 0), ("begin", -3)])
 def test_an_open_iterator_outside_its_vector_reads_nothing(start, step):
     vector = m.new_vectord([1.0, 2.0])
     iterator = getattr(m, "vectord_" + start)(vector)
