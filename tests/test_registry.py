@@ -28,18 +28,6 @@ def record(name):
 # ---- Descriptors and cast lists -----------------------------------------------------------------
 
 
-def test_cast_lists(peer):
-    """Output_Result accepts every other output record, ZarvoClient and IStringFactory their one derived
-    type; every other descriptor accepts only itself."""
-    expected = {name: {name} for name in peer.names()}
-    expected[OUTPUT_RESULT] |= {name for name in peer.names() if name.startswith(record(""))}
-    for base, derived in (("ZarvoClient", "ZarvoPelluxPostClient"), ("IStringFactory", "VStringFactory")):
-        expected["_p_ZarvoSDKClientCPP__" + base].add("_p_ZarvoSDKClientCPP__" + derived)
-    casts = {name: peer.casts(name) for name in peer.names()}
-    assert {name: set(found) for name, found in casts.items()} == expected
-    assert all(len(found) == len(set(found)) for found in casts.values())
-
-
 def test_records_of_many_kinds_pass_as_their_base_in_any_order(peer):
     """Each conversion through a cast moves its entry to the front of the base's list; every answer stays
     right, and the list keeps every entry once."""
@@ -69,8 +57,7 @@ def test_records_of_many_kinds_pass_as_their_base_in_any_order(peer):
     ([SAFE_STRING], TYPE_PARAMETER, 0, -1), ([OUTPUT_RESULT], record("GetFloat"), 0, -1),
     (["_p_ZarvoSDKClientCPP__ZarvoPelluxPostClient"], "_p_ZarvoSDKClientCPP__ZarvoClient", 0, 0),
     (["_p_ZarvoSDKClientCPP__VStringFactory"], "_p_ZarvoSDKClientCPP__IStringFactory", 0, 0), (["_p_int"], None, 0, 0),
-    (5, SAFE_STRING, 0, -1), ("text", SAFE_STRING, 0, -1), (object(), SAFE_STRING, 0, -1),
-    (None, SAFE_STRING, 0, 0), (None, SAFE_STRING, NO_NULL, -13), (None, SAFE_STRING, DISOWN, 0),
+    (object(), SAFE_STRING, 0, -1), (None, SAFE_STRING, 0, 0), (None, SAFE_STRING, NO_NULL, -13),
 ])
 def test_conversion_results(peer, made, target, flags, code):
     made = peer.make(made[0], 0x2220, NO_SHADOW) if isinstance(made, list) else made
@@ -145,7 +132,6 @@ def test_swigregister_attaches_the_class(peer, safe_string_class, form):
     result = peer.make(SAFE_STRING, 0x4440, 0)
     assert type(result) is Registered and type(result.this).__name__ == "SwigPyObject"
     assert int(result.this) == 0x4440 and result.this.own() is False
-    assert type(peer.make(SAFE_STRING, 0x4440, NO_SHADOW)).__name__ == "SwigPyObject"  # the bare proxy on request
 
 
 @pytest.mark.parametrize("args", [(), (object, object)])

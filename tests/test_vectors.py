@@ -105,7 +105,7 @@ def test_sizes_and_pop(inst):
 
 
 @by_instance
-@pytest.mark.parametrize("index, position", [(0, 0), (4, 4), (-1, 4), (-5, 0), (5, None), (-6, None), (2**31 - 1, None)])
+@pytest.mark.parametrize("index, position", [(0, 0), (-1, 4), (-5, 0), (5, None), (-6, None)])
 def test_index_access(inst, index, position):
     v, expected = inst.make(), list(inst.samples)
     get, set_, delete = inst.fn("__getitem__"), inst.fn("__setitem__"), inst.fn("__delitem__")
@@ -120,32 +120,27 @@ def test_index_access(inst, index, position):
         assert set_(v, index, expected[position]) is None and inst.read(v) == expected and delete(v, index) is None
         del expected[position]
     assert inst.read(v) == expected
-    # A bad element is reported against its own argument before the index is looked at.
-    text = f"in method '{inst.prefix}___setitem__', argument 3 of type '{inst.element}'"
-    text = "Expected string type" if inst.text else text
-    raises((TypeError, OverflowError), text, set_, v, 99, inst.wrong)
-    assert inst.read(v) == expected
 
 
 @by_instance
-@pytest.mark.parametrize("index", [0, -1])
-def test_no_element_in_an_empty_vector(inst, index):
+def test_no_element_in_an_empty_vector(inst):
     v = inst.make()
     inst.fn("clear")(v)  # its storage stays: a read past the end would answer rather than fault
-    raises(IndexError, "index out of range", inst.fn("__getitem__"), v, index)
-    raises(IndexError, "index out of range", inst.fn("__setitem__"), v, index, inst.samples[0])
-    raises(IndexError, "index out of range", inst.fn("__delitem__"), v, index)
+    raises(IndexError, "index out of range", inst.fn("__getitem__"), v, 0)
+    raises(IndexError, "index out of range", inst.fn("__setitem__"), v, 0, inst.samples[0])
+    raises(IndexError, "index out of range", inst.fn("__delitem__"), v, 0)
     assert inst.fn("size")(v) == 0
 
 
 # Every function that takes an element: its arguments after self, given an iterator at the vector's
 # begin and the element, and the element's argument number; None where the overload test refuses it.
+# (__setitem__'s index is out of range: the element is reported before the index is looked at.)
 @by_instance
 @pytest.mark.parametrize("member, arguments, position", [
     ("append", lambda at, x: (x,), 2),
     ("push_back", lambda at, x: (x,), 2),
     ("assign", lambda at, x: (2, x), 3),
-    ("__setitem__", lambda at, x: (1, x), 3),
+    ("__setitem__", lambda at, x: (99, x), 3),
     ("resize", lambda at, x: (7, x), None),
     ("insert", lambda at, x: (at, x), None),
     ("insert", lambda at, x: (at, 2, x), None),
@@ -225,8 +220,8 @@ def test_counts_whose_bytes_do_not_fit_a_32_bit_process(bounded_growth, inst, me
 
 @by_instance
 @pytest.mark.parametrize("member, args, position, error, arg_type", [
-    ("reserve", (-1,), 2, OverflowError, "size_type"), ("reserve", (2**32,), 2, OverflowError, "size_type"),
-    ("assign", (1.0, None), 2, TypeError, "size_type"), ("__getslice__", (2**31, 0), 2, OverflowError, "difference_type"),
+    ("reserve", (-1,), 2, OverflowError, "size_type"),
+    ("__getslice__", (2**31, 0), 2, OverflowError, "difference_type"),
     ("__delslice__", (0, 1.5), 3, TypeError, "difference_type"),
 ])
 def test_index_and_size_arguments(inst, member, args, position, error, arg_type):
@@ -287,7 +282,7 @@ def test_erase_and_insert_with_iterators(inst):
 
 
 @by_instance
-@pytest.mark.parametrize("size, at", [(5, 0), (5, 2), (5, 5), (0, 0)], ids=["start", "middle", "end", "empty"])
+@pytest.mark.parametrize("size, at", [(5, 0), (5, 5), (0, 0)], ids=["start", "end", "empty"])
 def test_erasing_an_empty_range(inst, size, at):
     v = inst.make(inst.samples[:size])
     position = m.SwigPyIterator___add__(inst.fn("begin")(v), at)
