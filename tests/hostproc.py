@@ -3,6 +3,7 @@ the module (a client whose operations answer with their record's fields) or byte
 
 A host is started on the loopback address with --port 0; its port is read from the first line it
 prints ("listening on 127.0.0.1:PORT") and its log (standard error) goes to a file."""
+import contextlib
 import functools
 import os
 import re
@@ -33,6 +34,12 @@ def commands():
     from Client3 import _catalogue
 
     return {name: (inputs, outputs) for name, _, inputs, outputs in _catalogue.COMMANDS}
+
+
+@functools.lru_cache(maxsize=None)
+def numbers():
+    """Each command's number on the wire, by name."""
+    return {name: number for number, name in enumerate(commands())}
 
 
 # ---- The process --------------------------------------------------------------------------------
@@ -153,6 +160,24 @@ def start(*options, log_path, timeout=10, command=None, env=None):
     return Host(process, int(line.rsplit(":", 1)[1]), log_path)
 
 
+def run_in_session(command, timeout, **options):
+    """Runs a program that may start applications of its own in a session of its own, ended whole when
+    it ends or when `timeout` passes, so that nothing it started outlives it; answers its
+    CompletedProcess (text output)."""
+    process = subprocess.Popen(command, stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True,
+                               start_new_session=True, **options)
+    try:
+        stdout, stderr = process.communicate(timeout=timeout)
+    finally:
+        if hasattr(os, "killpg"):
+            with contextlib.suppress(ProcessLookupError):
+                os.killpg(process.pid, signal.SIGKILL)
+        else:
+            process.kill()
+        process.wait()
+    return subprocess.CompletedProcess(command, process.returncode, stdout, stderr)
+
+
 # ---- Through the module -------------------------------------------------------------------------
 
 
@@ -250,7 +275,7 @@ def int_value(number):
 
 def request(number, command, *inputs):
     """A request frame for `command`, by name or by number."""
-    command = list(commands()).index(command) if isinstance(command, str) else command
+    command = numbers().get(command, command)
     return frame(b"Q" + struct.pack("<IH", number, command) + b"".join(inputs))
 
 

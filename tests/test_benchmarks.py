@@ -3,12 +3,11 @@ figure. The figures themselves are not checked."""
 import os
 import platform
 import re
-import signal
-import subprocess
 import sys
 
 import pytest
 
+import hostproc
 from conftest import SANITIZED
 
 BENCHMARKS = os.path.join(os.path.dirname(os.path.dirname(os.path.abspath(__file__))), "benchmarks")
@@ -30,19 +29,9 @@ ROWS = {
 
 @pytest.mark.parametrize("script", ROWS)
 def test_benchmark_prints_its_rows_in_its_quick_form(script):
-    # In a session of its own, so that the applications it starts end with it even when it hangs.
-    process = subprocess.Popen([sys.executable, os.path.join(BENCHMARKS, script), "--quick"],
-                               stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True, start_new_session=True)
-    try:
-        stdout, stderr = process.communicate(timeout=300)
-    finally:
-        try:
-            os.killpg(process.pid, signal.SIGKILL)
-        except ProcessLookupError:
-            pass
-        process.wait()
-    assert process.returncode == 0, stdout + stderr
-    lines = [line.strip().lstrip("|").strip() for line in stdout.splitlines()]
+    done = hostproc.run_in_session([sys.executable, os.path.join(BENCHMARKS, script), "--quick"], timeout=300)
+    assert done.returncode == 0, done.stdout + done.stderr
+    lines = [line.strip().lstrip("|").strip() for line in done.stdout.splitlines()]
     for row in ROWS[script]:
         found = [line for line in lines if line.startswith(row)]
-        assert found and all(re.search(r"\d", line[len(row):]) for line in found), (row, stdout)
+        assert found and all(re.search(r"\d", line[len(row):]) for line in found), (row, done.stdout)

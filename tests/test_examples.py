@@ -1,17 +1,18 @@
 """The examples run against their own application, and a strict type check passes on them."""
 import glob
 import os
-import subprocess
 import sys
 
 import pytest
+
+import hostproc
 
 ROOT = os.path.dirname(os.path.dirname(os.path.abspath(__file__)))
 EXAMPLES = sorted(glob.glob(os.path.join(ROOT, "examples", "*.py")))
 
 
 def run(*arguments, cwd):
-    return subprocess.run([sys.executable, *arguments], cwd=cwd, capture_output=True, text=True, timeout=120)
+    return hostproc.run_in_session([sys.executable, *arguments], timeout=120, cwd=cwd)
 
 
 def test_session_prints_the_account_and_writes_the_plot(tmp_path):
