@@ -84,8 +84,11 @@ class Deployed:
             with open(self.log, "wb") as log:
                 start = dict(cwd=folder, env=env, stdin=subprocess.DEVNULL, stdout=log, stderr=log)
                 where = os.path.join(folder, "scheduler.json")
+                # A lost worker counts against every take it holds, those waiting in its queue too;
+                # at a saturation of 1.0 a worker holds only the take it runs.
+                scheduler = dict(start, env=dict(env, DASK_DISTRIBUTED__SCHEDULER__WORKER_SATURATION="1.0"))
                 self._start([sys.executable, "-m", "dask", "scheduler", "--host", "127.0.0.1", "--port", "0",
-                             "--no-dashboard", "--scheduler-file", where], start)
+                             "--no-dashboard", "--scheduler-file", where], scheduler)
                 self.address = self._address(where)
                 for _ in range(workers):
                     self._start([sys.executable, "-m", "dask", "worker", self.address, "--nthreads", "1",
