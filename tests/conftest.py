@@ -7,6 +7,8 @@ import sys
 import pytest
 
 sys.path.insert(0, os.path.dirname(__file__))
+# The long checks, which the suite runs bounded.
+sys.path.insert(1, os.path.join(os.path.dirname(os.path.dirname(os.path.abspath(__file__))), "fuzz"))
 
 import companion  # noqa: E402
 import hostproc  # noqa: E402

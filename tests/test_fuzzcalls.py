@@ -2,7 +2,7 @@
 random arguments, in child interpreters, crashes nothing and leaves no SystemError behind."""
 import fuzzcalls
 
-# Long runs: python tests/fuzzcalls.py --calls 1000000
+# Long runs: python fuzz/fuzzcalls.py --calls 1000000
 CALLS, BATCH = 40000, 10000
 
 

@@ -1,9 +1,9 @@
 """Repeated calls of every function family, success and failure paths, with the growth of resident
 memory and of the interpreter's traced allocations measured over them.
 
-    python tests/repeat.py --calls 1000000      # every shape a million times; prints bytes per call
+    python fuzz/repeat.py --calls 1000000      # every shape a million times; prints bytes per call
 
-The tests (test_repeat.py) run the same shapes a bounded number of times."""
+The tests (tests/test_repeat.py) run the same shapes a bounded number of times."""
 import argparse
 import ctypes
 import gc
@@ -15,7 +15,7 @@ import tracemalloc
 
 import _Client3 as m
 
-HERE = os.path.dirname(os.path.abspath(__file__))
+TESTS = os.path.join(os.path.dirname(os.path.dirname(os.path.abspath(__file__))), "tests")  # the suite's helpers
 PAGE = os.sysconf("SC_PAGE_SIZE") if hasattr(os, "sysconf") else 4096
 
 
@@ -132,7 +132,7 @@ def main():
     parser = argparse.ArgumentParser(description=__doc__.split("\n\n")[0])
     parser.add_argument("--calls", type=int, default=1000000)
     options = parser.parse_args()
-    sys.path.insert(0, HERE)
+    sys.path.insert(0, TESTS)
     import companion
     import hostproc
     classes = companion.register()

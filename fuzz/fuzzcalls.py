@@ -1,6 +1,6 @@
 """Seeded random-argument fuzzing of every module function.
 
-    python tests/fuzzcalls.py --calls 1000000 --seed 1 [--batch 20000] [--jobs 2]
+    python fuzz/fuzzcalls.py --calls 1000000 --seed 1 [--batch 20000] [--jobs 2]
 
 Each batch of calls runs in a child interpreter of its own, with a demo application on loopback for
 the client functions. The arguments are drawn at random (wrong types, wrong counts, boundary
@@ -25,7 +25,7 @@ import tempfile
 import time
 from concurrent.futures import ThreadPoolExecutor
 
-HERE = os.path.dirname(os.path.abspath(__file__))
+TESTS = os.path.join(os.path.dirname(os.path.dirname(os.path.abspath(__file__))), "tests")  # the suite's helpers
 
 # The calls that are not made, and how each is avoided.
 UNDEFINED = [
@@ -381,7 +381,7 @@ def closed_port():
 
 def child(seed, calls, port, trace):
     """One batch in this interpreter; prints the SystemErrors it met, one per line."""
-    sys.path.insert(0, HERE)
+    sys.path.insert(0, TESTS)
     import _Client3
     import companion
     classes = companion.register()
@@ -394,7 +394,7 @@ def child(seed, calls, port, trace):
 def run_batch(seed, calls, timeout):
     """Runs one batch in a child, with an application of its own in a scratch directory; returns
     (a description of the crash or None, the system errors)."""
-    sys.path.insert(0, HERE)
+    sys.path.insert(0, TESTS)
     import hostproc
     with tempfile.TemporaryDirectory() as folder:
         host = hostproc.start("--frames", "30", log_path=os.path.join(folder, "host.log"))
