@@ -14,6 +14,7 @@ import socket
 import struct
 import subprocess
 import sysconfig
+import threading
 import time
 
 import _Client3 as m
@@ -122,23 +123,28 @@ class Host:
 
 
 # Hosts asked to stop whose end is collected later: an application that has served a client takes a
-# tenth of a second to stop, which a test need not wait for.
+# tenth of a second to stop, which a test need not wait for. Hosts are started from several threads
+# at once (the random-argument fuzzer's batches): each host is taken off the list by one of them.
 _stopping = []
+_stopping_lock = threading.Lock()
 
 
 def stop_later(host):
     """Asks `host` to stop; `collect` waits for it."""
     host.send(signal.SIGTERM)
-    _stopping.append(host)
+    with _stopping_lock:
+        _stopping.append(host)
 
 
 def collect(ended_only=False):
     """Waits for the hosts asked to stop (killing those that do not stop in time), or collects only
     those that have ended."""
-    for host in list(_stopping):
-        if not ended_only or not host.running():
-            host.stop()
+    with _stopping_lock:
+        taken = [host for host in _stopping if not ended_only or not host.running()]
+        for host in taken:
             _stopping.remove(host)
+    for host in taken:
+        host.stop()
 
 
 def start(*options, log_path, timeout=10, command=None, env=None):
