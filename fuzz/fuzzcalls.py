@@ -25,7 +25,7 @@ import tempfile
 import time
 from concurrent.futures import ThreadPoolExecutor
 
-TESTS = os.path.join(os.path.dirname(os.path.dirname(os.path.abspath(__file__))), "tests")  # the suite's helpers
+import suitepath  # noqa: F401  (the suite's helpers, imported where they are needed)
 
 # The calls that are not made, and how each is avoided.
 UNDEFINED = [
@@ -381,7 +381,6 @@ def closed_port():
 
 def child(seed, calls, port, trace):
     """One batch in this interpreter; prints the SystemErrors it met, one per line."""
-    sys.path.insert(0, TESTS)
     import _Client3
     import companion
     classes = companion.register()
@@ -394,7 +393,6 @@ def child(seed, calls, port, trace):
 def run_batch(seed, calls, timeout):
     """Runs one batch in a child, with an application of its own in a scratch directory; returns
     (a description of the crash or None, the system errors)."""
-    sys.path.insert(0, TESTS)
     import hostproc
     with tempfile.TemporaryDirectory() as folder:
         host = hostproc.start("--frames", "30", log_path=os.path.join(folder, "host.log"))

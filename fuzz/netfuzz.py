@@ -16,12 +16,10 @@ import tempfile
 import time
 
 import _Client3 as m
+import suitepath  # noqa: F401  (the suite's helpers, imported next)
 
-TESTS = os.path.join(os.path.dirname(os.path.dirname(os.path.abspath(__file__))), "tests")
-sys.path.insert(0, TESTS)
-
-import companion  # noqa: E402
-import hostproc  # noqa: E402
+import companion
+import hostproc
 from hostproc import (MAX_FRAME, Client, commands, frame, hello, int_value, read_frame, refusal, reply, request,
                       text_value, wait_until)
 

@@ -8,14 +8,13 @@ import argparse
 import ctypes
 import gc
 import os
-import sys
 import tempfile
 import time
 import tracemalloc
 
 import _Client3 as m
+import suitepath  # noqa: F401  (the suite's helpers, imported where they are needed)
 
-TESTS = os.path.join(os.path.dirname(os.path.dirname(os.path.abspath(__file__))), "tests")  # the suite's helpers
 PAGE = os.sysconf("SC_PAGE_SIZE") if hasattr(os, "sysconf") else 4096
 
 
@@ -132,7 +131,6 @@ def main():
     parser = argparse.ArgumentParser(description=__doc__.split("\n\n")[0])
     parser.add_argument("--calls", type=int, default=1000000)
     options = parser.parse_args()
-    sys.path.insert(0, TESTS)
     import companion
     import hostproc
     classes = companion.register()
