@@ -2,6 +2,7 @@
 packed values."""
 import operator
 import os
+import struct
 import sys
 
 import pytest
@@ -66,6 +67,15 @@ def test_equality_compares_addresses_and_there_is_no_ordering(peer, left, right,
 def test_int_is_the_native_address(peer, address):
     assert int(peer.make("_p_int", address, NO_SHADOW)) == address
     assert peer.make("_p_int", 0, NO_SHADOW | OWN) is None  # a null address makes None
+
+
+def test_an_object_laid_out_like_a_proxy_is_not_read_as_one(peer):
+    """A complex number's two halves lie where a proxy keeps its address and its type: here, those of
+    a real string. Only a proxy's own type makes an object a proxy."""
+    real = _Client3.new_SafeString("walk")
+    lookalike = complex(*struct.unpack("dd", struct.pack("QQ", int(real), peer.proxy_type(real))))
+    raises(TypeError, "in method 'SafeString_Value', argument 1 of type 'ZarvoSDKClientCPP::SafeString const *'",
+           _Client3.SafeString_Value, lookalike)
 
 
 # (flags made with, calls as (method, args), results, ownership after)
