@@ -26,12 +26,6 @@ MARKER_BONES = "Head Head Thorax Thorax Pelvis Pelvis LeftHand RightHand LeftShi
 BONES = ("Pelvis Thorax Head LeftArm LeftHand RightArm RightHand LeftThigh LeftShin LeftFoot RightThigh RightShin "
          "RightFoot").split()
 CONSTRAINTS = [f"{marker}_{bone}" for marker, bone in zip(MARKERS, MARKER_BONES)]
-# The occlusions of the demo scene: (subject, marker) -> (first frame, length in frames).
-GAPS = {
-    ("Alice", "LWRA"): (121, 12), ("Alice", "RANK"): (401, 35), ("Alice", "C7"): (701, 6), ("Alice", "RWRA"): (851, 80),
-    ("Bob", "LANK"): (251, 20), ("Bob", "STRN"): (521, 4), ("Bob", "LKNE"): (611, 45), ("Bob", "LWRA"): (901, 15),
-}
-
 TIMED_OUT = "Host application failed to respond to the information request."
 PARSING = "Unable to interpret information sent from the host application."
 REFUSED = "Host application encountered an error processing the request."
@@ -172,21 +166,6 @@ def test_refusal_carries_the_application_message(client, operation, args, code, 
     assert client.result(operation, *args) == (code, message)
     # The connection is still good for the next request.
     assert client.GetRootBone("Alice", "") == "Pelvis"
-
-
-@pytest.mark.parametrize("subject", ["Alice", "Bob"])
-def test_trajectories_hold_every_frame_and_read_zero_in_their_gaps(client, subject):
-    for marker in MARKERS:
-        x, y, z, seen = client.GetTrajectory(subject, marker)
-        assert [len(axis) for axis in (x, y, z, seen)] == [FRAMES] * 4
-        first, length = GAPS.get((subject, marker), (0, 0))
-        assert [f for f in range(1, FRAMES + 1) if not seen[f - 1]] == list(range(first, first + length)), marker
-        for i in range(FRAMES):
-            if seen[i]:
-                assert z[i] > 0, (marker, i + 1)
-                assert i == 0 or not seen[i - 1] or abs(x[i] - x[i - 1]) < 50, (marker, i + 1)
-            else:
-                assert (x[i], y[i], z[i]) == (0, 0, 0), (marker, i + 1)
 
 
 @pytest.mark.parametrize("subject, marker, frame", [
@@ -456,15 +435,6 @@ def test_stop_signal_ends_the_application_with_status_zero(start_host, clients, 
     stamp = datetime.strptime(host.log().splitlines()[-1][:19], "%Y-%m-%d %H:%M:%S")
     assert abs(datetime.now() - stamp) < timedelta(minutes=2)  # the log's times are local
     assert wait_until(lambda: connected.IsConnected() is False)
-
-
-def test_the_exit_fault_ends_the_application_at_that_commands_nth_request(start_host, clients):
-    host = start_host("--fault", "exit=2@GetFrameCount")
-    client = clients(host)
-    assert client.result("GetSubjectNames") == (m.Success, "OK")  # other commands do not count
-    assert client.GetFrameCount() == 1000
-    assert client.GetFrameCount() == 0  # no reply: the application is gone
-    assert host.process.wait(10) == 3
 
 
 def test_watch_stdin_stops_the_application_at_the_end_of_its_input(start_host):
