@@ -11,6 +11,7 @@ import pytest
 from scipy import interpolate
 
 import _Client3 as m
+from test_filters import runs
 
 RIGID = 1e-6  # mm: the demo's markers on one segment move together, so a neighbour's fill is exact
 
@@ -83,12 +84,6 @@ def test_gaps_up_to_the_transition_time_are_filled_and_longer_ones_stay_untouche
     assert trajectory(app, "Alice", "LFHD")[1].all()
 
 
-def test_a_fix_while_occlusion_fixing_is_off_is_refused_and_changes_nothing(app, tmp_path):
-    set_occlusion(app, "Enabled", False)
-    before = app.scene_file(tmp_path / "scene")
-    assert "occlusion fixing is off (OcclusionFixing setting 'Enabled')" in app.result("OfflineFixOcclusion", "Alice", "")[1]
-    assert app.scene_file(tmp_path / "scene") == before
-
 # ---- The pipeline: the order of the stages, their preconditions and their recorded results ----
 
 CHAIN = [  # (operation, arguments) in an order that meets every precondition, for Alice
@@ -123,12 +118,6 @@ def seen_frames(app, subject):
 
 # ---- What each stage says it did: the success record's text, its numbers counted from the scene ----
 
-def runs_of(mask):
-    """(first, end) of every run of True in a boolean array."""
-    edges = np.flatnonzero(np.diff(np.concatenate([[0], mask.astype(int), [0]])))
-    return list(zip(edges[::2], edges[1::2]))
-
-
 def bones_of_markers(app, subject):
     """Each marker's bone, from the subject's constraints."""
     return {app.GetConstraintDetails(subject, "", c)[1]: app.GetConstraintDetails(subject, "", c)[2]
@@ -146,7 +135,7 @@ def fix_summary(app, subject, longest=50):
     bone = bones_of_markers(app, subject)
     filled = rigid = longer = ends = 0
     for marker, mask in seen.items():
-        for first, end in runs_of(~mask):
+        for first, end in runs(~mask):
             if first == 0 or end == len(mask):
                 ends += 1
             elif end - first > longest:
@@ -267,11 +256,6 @@ def test_a_stage_whose_need_has_not_run_is_refused_and_changes_nothing(app, tmp_
     assert app.scene_file(tmp_path / "scene") == before
 
 
-def test_camera_calibration_needs_two_cameras(app):
-    app.NewScene()
-    assert "needs at least two cameras in the scene, and there are 0" in app.result("OfflineCalibrateCameras", "")[1]
-
-
 def test_quick_post_runs_its_stages_in_order_until_one_cannot_run(app):
     assert app.result("OfflineQuickPost", "Alice", "")[1] == (
         "quick post stopped at 'OfflineAutoLabel': 'OfflineAutoLabel' needs 'OfflineReconstruct' to run first")
@@ -336,17 +320,6 @@ def test_automatic_labelling_gives_each_trajectory_back_its_label(app, scramble,
         assert (now == seen).all(), marker
         assert (after[:, seen] == values[:, seen]).all(), marker
     assert f"moved={moved},dropped=0;" in state(app)["Pipeline OfflineAutoLabel Alice"]
-
-
-def test_labelling_refuses_templates_closer_than_the_separation_distance(app, tmp_path):
-    run_chain(app, 2)
-    settings = app.record("OfflineGetLabelROMSettings")
-    m.Output_LabelROMSettings_SeparationDistance_set(settings, 200)
-    app.OfflineSetLabelROMSettings(settings)
-    before = app.scene_file(tmp_path / "scene")
-    message = app.result("OfflineLabelROM", "Alice", "")[1]
-    assert "of subject 'Alice' lie closer together than the LabelROM setting 'SeparationDistance' (200 mm)" in message
-    assert app.scene_file(tmp_path / "scene") == before
 
 
 @pytest.mark.parametrize("constraint, markers", [
@@ -418,6 +391,12 @@ def zero_height(app):
     app.ParameterSet(alice, app.ObjectGetParameter(alice, 1, "Height"), 1, "Value", "0")
 
 
+def separate_templates_by_200_mm(app):
+    settings = app.record("OfflineGetLabelROMSettings")
+    m.Output_LabelROMSettings_SeparationDistance_set(settings, 200)
+    app.OfflineSetLabelROMSettings(settings)
+
+
 @pytest.mark.parametrize("ran, spoil, operation, args, message", [
     (2, hide_marker, "OfflineLabelROM", ("Alice", ""), "no frame of the take sees every marker of subject 'Alice'"),
     (2, lambda app: hide_marker(app, "Bob"), "OfflineLabelROM", ("", ""),  # Alice, labelled first, is not written either
@@ -425,8 +404,14 @@ def zero_height(app):
     (4, break_constraint, "OfflineCreateSolvingSetupFromLS", ("Alice",),
      "constraint 'STRN_Thorax' of subject 'Alice' ties marker 'NOPE', which the subject does not have"),
     (9, zero_height, "OfflineRetarget", ("Alice",), "subject 'Alice' has no positive Height parameter to retarget from"),
+    (2, separate_templates_by_200_mm, "OfflineLabelROM", ("Alice", ""),
+     "markers 'LFHD' and 'RFHD' of subject 'Alice' lie closer together than the LabelROM setting 'SeparationDistance' (200 mm)"),
+    (0, lambda app: set_occlusion(app, "Enabled", False), "OfflineFixOcclusion", ("Alice", ""),
+     "occlusion fixing is off (OcclusionFixing setting 'Enabled')"),
+    (0, lambda app: app.NewScene(), "OfflineCalibrateCameras", ("",),
+     "'OfflineCalibrateCameras' needs at least two cameras in the scene, and there are 0"),
 ])
-def test_a_stage_that_cannot_compute_its_result_is_refused_and_changes_nothing(app, tmp_path, ran, spoil, operation, args, message):
+def test_a_stage_the_scene_or_its_settings_forbid_is_refused_and_changes_nothing(app, tmp_path, ran, spoil, operation, args, message):
     run_chain(app, ran)
     spoil(app)
     before = app.scene_file(tmp_path / "scene")
