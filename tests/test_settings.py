@@ -68,11 +68,6 @@ def ranged(least, most):
     return f"from {plain[0]} to {plain[1]}"
 
 
-@pytest.mark.parametrize("record", FIELDS)
-def test_a_new_host_has_the_documented_defaults(app, record):
-    assert values(app, record) == tuple(f[1] for f in FIELDS[record])
-
-
 @pytest.mark.parametrize("record, field, least, most", NUMBERS)
 def test_a_number_is_taken_at_both_ends_of_its_range_and_refused_beyond_them(app, record, field, least, most):
     index = [f[0] for f in FIELDS[record]].index(field)
