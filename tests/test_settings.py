@@ -103,17 +103,6 @@ def test_a_text_field_takes_only_its_words(app, record, field, words):
     assert values(app, record)[index] == words[-1]
 
 
-def test_a_record_is_applied_whole_or_not_at_all(app):
-    settings = get(app, "Reconstruct")
-    put(settings, "Reconstruct", "EnvironmentalDriftTolerance", 2.5)  # valid
-    put(settings, "Reconstruct", "NumThreads", 65)  # invalid, declared after it
-    assert app.result("OfflineSetReconstructSettings", settings)[0] != m.Success
-    assert values(app, "Reconstruct")[0] == 1.5
-    put(settings, "Reconstruct", "NumThreads", 4)
-    app.OfflineSetReconstructSettings(settings)
-    assert values(app, "Reconstruct")[0] == 2.5 and values(app, "Reconstruct")[-1] == 4
-
-
 @pytest.mark.parametrize("low, high", [("MinCamsToContinueTrajectory", "MinCamsToStartTrajectory"),
                                        ("MinCentroidRadius", "MaxCentroidRadius"),
                                        ("MinReconstructionRadius", "MaxReconstructionRadius"),
