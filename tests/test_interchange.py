@@ -49,6 +49,20 @@ def write_c3d(path, labels, points, rate=100.0):
         writer.write(handle)
 
 
+def test_exported_c3d_is_read_by_an_independent_reader(app, tmp_path):
+    app.TimelineSetFrameRate(120.0)
+    lank = app.SceneGetObject("/Alice/LANK")[0]
+    app.ChannelDeleteKey(lank, int(app.ObjectGetChannel(lank, "Z")[2]), 7)  # keyed in X and Y only: not seen
+    path = tmp_path / "walk.c3d"
+    app.ExportFile(str(path), "")
+    written = independent(path, strict=True)
+    expected = trajectories(app)
+    assert (written.labels, written.rate, written.first_frame) == (list(expected), 120.0, 1)
+    for column, (x, y, z, e) in enumerate(expected.values()):
+        assert written.e[:, column].tolist() == e
+        assert np.array_equal(written.xyz[:, column], np.float32(np.array([x, y, z]).T * np.array(e)[:, None]))
+
+
 def test_a_take_longer_than_a_c3d_header_can_count(start_host, clients, tmp_path):
     app = clients(start_host("--scene", "empty", "--frames", "70000"))
     subject = app.SceneCreateObject("Subject", "S", app.SceneGetObject("/")[0], "")[0]
