@@ -29,10 +29,10 @@ def cut(app, subject, marker, first, length):
     return values
 
 
-def set_occlusion(app, field, value):
-    settings = app.record("OfflineGetOcclusionFixingSettings")
-    getattr(m, f"Output_OcclusionFixingSettings_{field}_set")(settings, value)
-    app.OfflineSetOcclusionFixingSettings(settings)
+def set_setting(app, record, field, value):
+    settings = app.record(f"OfflineGet{record}Settings")
+    getattr(m, f"Output_{record}Settings_{field}_set")(settings, value)
+    getattr(app, f"OfflineSet{record}Settings")(settings)
 
 
 def distance(a, b):
@@ -79,7 +79,7 @@ def test_gaps_up_to_the_transition_time_are_filled_and_longer_ones_stay_untouche
     left, seen = trajectory(app, "Alice", "LFHD")
     assert not seen[300:351].any()
     assert (left == longer).all()
-    set_occlusion(app, "TransitionTime", 0.51)
+    set_setting(app, "OcclusionFixing", "TransitionTime", 0.51)
     app.OfflineFixOcclusion("Alice", "")
     assert trajectory(app, "Alice", "LFHD")[1].all()
 
@@ -152,7 +152,7 @@ def test_occlusion_fixing_says_what_it_filled_and_left_and_without_apply_fixed_m
     cut(app, "Bob", "RKNE", 0, 3)  # a gap at the take's start stays
     expected = "; ".join(fix_summary(app, subject) for subject in ("Alice", "Bob"))
     assert app.result("OfflineFixOcclusion", "", "") == (m.Success, expected)
-    set_occlusion(app, "ApplyFixedMarkers", False)
+    set_setting(app, "OcclusionFixing", "ApplyFixedMarkers", False)
     truth, seen = trajectory(app, "Bob", "RFHD")
     seen[500:530] = False
     zeroed = truth.copy()
@@ -391,12 +391,6 @@ def zero_height(app):
     app.ParameterSet(alice, app.ObjectGetParameter(alice, 1, "Height"), 1, "Value", "0")
 
 
-def separate_templates_by_200_mm(app):
-    settings = app.record("OfflineGetLabelROMSettings")
-    m.Output_LabelROMSettings_SeparationDistance_set(settings, 200)
-    app.OfflineSetLabelROMSettings(settings)
-
-
 @pytest.mark.parametrize("ran, spoil, operation, args, message", [
     (2, hide_marker, "OfflineLabelROM", ("Alice", ""), "no frame of the take sees every marker of subject 'Alice'"),
     (2, lambda app: hide_marker(app, "Bob"), "OfflineLabelROM", ("", ""),  # Alice, labelled first, is not written either
@@ -404,9 +398,9 @@ def separate_templates_by_200_mm(app):
     (4, break_constraint, "OfflineCreateSolvingSetupFromLS", ("Alice",),
      "constraint 'STRN_Thorax' of subject 'Alice' ties marker 'NOPE', which the subject does not have"),
     (9, zero_height, "OfflineRetarget", ("Alice",), "subject 'Alice' has no positive Height parameter to retarget from"),
-    (2, separate_templates_by_200_mm, "OfflineLabelROM", ("Alice", ""),
+    (2, lambda app: set_setting(app, "LabelROM", "SeparationDistance", 200), "OfflineLabelROM", ("Alice", ""),
      "markers 'LFHD' and 'RFHD' of subject 'Alice' lie closer together than the LabelROM setting 'SeparationDistance' (200 mm)"),
-    (0, lambda app: set_occlusion(app, "Enabled", False), "OfflineFixOcclusion", ("Alice", ""),
+    (0, lambda app: set_setting(app, "OcclusionFixing", "Enabled", False), "OfflineFixOcclusion", ("Alice", ""),
      "occlusion fixing is off (OcclusionFixing setting 'Enabled')"),
     (0, lambda app: app.NewScene(), "OfflineCalibrateCameras", ("",),
      "'OfflineCalibrateCameras' needs at least two cameras in the scene, and there are 0"),
