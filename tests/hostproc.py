@@ -2,7 +2,8 @@
 the module (a client whose operations answer with their record's fields) or byte by byte on the wire.
 
 A host is started on the loopback address with --port 0; its port is read from the first line it
-prints ("listening on 127.0.0.1:PORT") and its log (standard error) goes to a file."""
+prints ("listening on 127.0.0.1:PORT") and its log (standard error) goes to a file. This process holds
+its standard input (--watch-stdin), so that it ends with the tests however they end."""
 import contextlib
 import functools
 import os
@@ -118,7 +119,9 @@ class Host:
         except subprocess.TimeoutExpired:
             self.process.kill()
             self.process.wait(timeout)
-        self.process.stdout.close()
+        for pipe in (self.process.stdin, self.process.stdout):
+            if pipe:
+                pipe.close()
         return self.process.returncode
 
 
@@ -150,14 +153,17 @@ def collect(ended_only=False):
 def start(*options, log_path, timeout=10, command=None, env=None):
     """Starts the application with `options` (which may name another --host) on a port the system picks;
     returns its Host, or raises RuntimeError with its exit status and log when it does not start.
-    `command` runs another build of it (the Windows one under Wine), with the environment `env`."""
+    `command` runs another build of it (the Windows one under Wine, whose input is not watched), with the
+    environment `env`."""
     collect(ended_only=True)
-    command = command or [executable()]
+    watched = command is None
+    command = command or [executable(), "--watch-stdin"]
     if not command[0]:
         raise RuntimeError(f"{NAME} is not installed: install the project with 'pip install .'")
     with open(log_path, "wb") as log:
         process = subprocess.Popen([*command, "--host", ADDRESS, "--port", "0", *options], env=env,
-                                   stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=log)
+                                   stdin=subprocess.PIPE if watched else subprocess.DEVNULL, stdout=subprocess.PIPE,
+                                   stderr=log)
     line = first_line(process.stdout, time.monotonic() + timeout)
     if not line.startswith("listening on "):
         host = Host(process, None, log_path)

@@ -438,6 +438,7 @@ def test_stop_signal_ends_the_application_with_status_zero(start_host, clients, 
 
 
 def test_watch_stdin_stops_the_application_at_the_end_of_its_input(start_host):
-    host = start_host("--watch-stdin")  # its standard input is empty
+    host = start_host()  # started with --watch-stdin, its input held by this process
+    host.process.stdin.close()
     assert host.process.wait(10) == 0
     assert host.log().endswith(" info stopped\n")
