@@ -12,6 +12,7 @@ from scipy import interpolate
 
 import _Client3 as m
 from test_filters import runs
+from test_settings import set_setting
 
 RIGID = 1e-6  # mm: the demo's markers on one segment move together, so a neighbour's fill is exact
 
@@ -27,12 +28,6 @@ def cut(app, subject, marker, first, length):
     hidden[first:first + length] = False
     app.SetTrajectory(subject, marker, *[list(v) for v in values], [bool(v) for v in hidden])
     return values
-
-
-def set_setting(app, record, field, value):
-    settings = app.record(f"OfflineGet{record}Settings")
-    getattr(m, f"Output_{record}Settings_{field}_set")(settings, value)
-    getattr(app, f"OfflineSet{record}Settings")(settings)
 
 
 def distance(a, b):

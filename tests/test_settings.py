@@ -59,6 +59,13 @@ def put(settings, record, field, value):
     getattr(m, f"Output_{record}Settings_{field}_set")(settings, value)
 
 
+def set_setting(app, record, field, value):
+    """Sets one field of a stage's settings, the others kept (a refusal fails the test)."""
+    settings = get(app, record)
+    put(settings, record, field, value)
+    getattr(app, f"OfflineSet{record}Settings")(settings)
+
+
 def values(app, record):
     return getattr(app, f"OfflineGet{record}Settings")()
 
